@@ -1,0 +1,12 @@
+#pragma once
+/// \file
+/// The public face of the midebug library: code outside it includes only this.
+
+#include "kernel/gdbkernel.h"
+#include "kernel/gdblogevent.h"
+#include "kernel/lldbkernel.h"
+#include "kernel/raclient.h"
+#include "platform/hostfiles.h"
+#include "platform/hostthread.h"
+#include "platform/textencoding.h"
+#include "platform/types.h"

@@ -1,0 +1,85 @@
+#include "platform/textencoding.h"
+
+#include <cstdint>
+
+namespace midebug {
+
+bool IsValidUTF8(std::string_view Bytes) {
+  const auto* Next = reinterpret_cast<const unsigned char*>(Bytes.data());
+  const auto* End = Next + Bytes.size();
+  while (Next < End) {
+    const unsigned char Lead = *Next;
+    if (Lead < 0x80) {
+      ++Next;
+      continue;
+    }
+    int Trail;
+    uint32_t CodePoint;
+    uint32_t Minimum;
+    if ((Lead & 0xE0) == 0xC0) {
+      Trail = 1, CodePoint = Lead & 0x1F, Minimum = 0x80;
+    } else if ((Lead & 0xF0) == 0xE0) {
+      Trail = 2, CodePoint = Lead & 0x0F, Minimum = 0x800;
+    } else if ((Lead & 0xF8) == 0xF0) {
+      Trail = 3, CodePoint = Lead & 0x07, Minimum = 0x10000;
+    } else {
+      return false;
+    }
+    if (End - Next <= Trail)
+      return false;
+    for (int I = 1; I <= Trail; ++I) {
+      if ((Next[I] & 0xC0) != 0x80)
+        return false;
+      CodePoint = (CodePoint << 6) | (Next[I] & 0x3F);
+    }
+    if (CodePoint < Minimum || CodePoint > 0x10FFFF || (CodePoint >= 0xD800 && CodePoint <= 0xDFFF))
+      return false;
+    Next += Trail + 1;
+  }
+  return true;
+}
+
+namespace {
+
+/// Code points of the bytes 0x80 to 0x9F in Windows-1252; the rest of the
+/// upper half equals Latin-1.
+constexpr uint16_t Windows1252High[32] = {
+    0x20AC, 0x0081, 0x201A, 0x0192, 0x201E, 0x2026, 0x2020, 0x2021, 0x02C6, 0x2030, 0x0160,
+    0x2039, 0x0152, 0x008D, 0x017D, 0x008F, 0x0090, 0x2018, 0x2019, 0x201C, 0x201D, 0x2022,
+    0x2013, 0x2014, 0x02DC, 0x2122, 0x0161, 0x203A, 0x0153, 0x009D, 0x017E, 0x0178};
+
+void AppendUTF8(std::string& Text, uint32_t CodePoint) {
+  if (CodePoint < 0x80) {
+    Text += static_cast<char>(CodePoint);
+  } else if (CodePoint < 0x800) {
+    Text += static_cast<char>(0xC0 | (CodePoint >> 6));
+    Text += static_cast<char>(0x80 | (CodePoint & 0x3F));
+  } else {
+    Text += static_cast<char>(0xE0 | (CodePoint >> 12));
+    Text += static_cast<char>(0x80 | ((CodePoint >> 6) & 0x3F));
+    Text += static_cast<char>(0x80 | (CodePoint & 0x3F));
+  }
+}
+
+} // namespace
+
+std::string AnsiToUTF8(std::string_view Bytes) {
+  std::string Text;
+  Text.reserve(Bytes.size() + Bytes.size() / 4);
+  for (const char Byte : Bytes) {
+    const auto Value = static_cast<unsigned char>(Byte);
+    if (Value < 0x80)
+      Text += Byte;
+    else if (Value < 0xA0)
+      AppendUTF8(Text, Windows1252High[Value - 0x80]);
+    else
+      AppendUTF8(Text, Value);
+  }
+  return Text;
+}
+
+std::string DecodeUTF8OrAnsi(std::string_view Bytes) {
+  return IsValidUTF8(Bytes) ? std::string(Bytes) : AnsiToUTF8(Bytes);
+}
+
+} // namespace midebug
