@@ -274,7 +274,14 @@ bool TGDBKernel::GetReply(std::string& Reply) {
       FBuffer.resize(FLastBytesRead + ReplyBufferStep);
     const Int64 BytesRead = Read(FBuffer.data() + FLastBytesRead, FBuffer.size() - FLastBytesRead);
     if (BytesRead < 0) {
-      Result = false;
+      // What the debugger printed before it went (such as "^exit") is still
+      // a reply; the next call reports the failure.
+      if (FLastBytesRead > 0) {
+        Reply = DecodeUTF8OrAnsi(std::string_view(FBuffer.data(), FLastBytesRead));
+        Log({}, true);
+      } else {
+        Result = false;
+      }
       break;
     }
     if (BytesRead == 0) {

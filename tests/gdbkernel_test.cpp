@@ -1,0 +1,314 @@
+// The local debugger transport against the real GDB and the scripted fake.
+
+#include "midebug.h"
+#include "testsupport.h"
+
+#include <gtest/gtest.h>
+
+#include <filesystem>
+#include <fstream>
+#include <sstream>
+#include <sys/stat.h>
+
+namespace midebug {
+namespace {
+
+using test::FakeDebuggerPath;
+using test::TScopedEnv;
+using test::TScratchDir;
+
+std::string ReadWholeFile(const std::string& Path) {
+  std::ifstream In(Path, std::ios::binary);
+  std::stringstream Text;
+  Text << In.rdbuf();
+  return Text.str();
+}
+
+/// Reads reply blocks until one contains Needle; gives up on a read error.
+std::string ReplyContaining(TGDBKernel& Kernel, const std::string& Needle) {
+  std::string Reply;
+  while (Kernel.GetReply(Reply))
+    if (Reply.find(Needle) != std::string::npos)
+      return Reply;
+  return "read failed: " + Kernel.GetLastError(true);
+}
+
+/// A kernel running the fake debugger on a script given inline.
+class FakeDebuggerTest : public ::testing::Test {
+protected:
+  template <class TKernel = TGDBKernel>
+  std::unique_ptr<TKernel> StartFake(const std::string& Script, const std::string& Launcher = {}) {
+    ScriptEnv = std::make_unique<TScopedEnv>("FAKEMI_SCRIPT", Scratch.WriteFile("fake.script", Script));
+    auto Kernel = std::make_unique<TKernel>(Launcher.empty() ? FakeDebuggerPath() : Launcher, "");
+    EXPECT_TRUE(Kernel->Start()) << Kernel->GetLastError(false);
+    return Kernel;
+  }
+
+  TScratchDir Scratch;
+  std::unique_ptr<TScopedEnv> ScriptEnv;
+};
+
+TEST(KernelWithGdb, StartsWithMiOptionsAndAnswersARequest) {
+  TGDBKernel Kernel("", "");
+  EXPECT_EQ(Kernel.GetCommandLine(), "\"gdb\" --nw --nx  --interpreter=mi2");
+  ASSERT_TRUE(Kernel.Start()) << Kernel.GetLastError(false);
+
+  std::string Greeting;
+  ASSERT_TRUE(Kernel.GetReply(Greeting));
+  EXPECT_NE(Greeting.find("=thread-group-added"), std::string::npos);
+
+  ASSERT_TRUE(Kernel.SendRequest("0980000000001-gdb-version"));
+  std::string Reply;
+  ASSERT_TRUE(Kernel.GetReply(Reply));
+  EXPECT_NE(Reply.find("~\"GNU gdb"), std::string::npos);
+  // The block ends with the result record's line; the prompt is not part of it.
+  EXPECT_TRUE(Reply.ends_with("0980000000001^done\n")) << Reply;
+  EXPECT_EQ(Reply.find("(gdb)"), std::string::npos);
+}
+
+TEST(KernelWithGdb, DrainsAfterStopThenReportsProcessExited) {
+  TGDBKernel Kernel("", "");
+  ASSERT_TRUE(Kernel.Start());
+  std::string Reply;
+  ASSERT_TRUE(Kernel.GetReply(Reply));
+  ASSERT_TRUE(Kernel.SendRequest("1-gdb-version"));
+  ASSERT_TRUE(Kernel.GetReply(Reply));
+  Kernel.Stop();
+  EXPECT_FALSE(Kernel.GetReply(Reply));
+  EXPECT_EQ(Kernel.GetLastError(true), "process exited");
+}
+
+TEST(KernelWithGdb, ReportsTheDebuggersEndAsProcessExited) {
+  TGDBKernel Kernel("", "");
+  ASSERT_TRUE(Kernel.Start());
+  ASSERT_TRUE(Kernel.SendRequest("7-gdb-exit"));
+  EXPECT_EQ(ReplyContaining(Kernel, "7^exit").find("read failed"), std::string::npos);
+  std::string Reply;
+  while (Kernel.GetReply(Reply)) {
+  }
+  EXPECT_EQ(Kernel.GetLastError(true), "process exited");
+  // Writing to a debugger that has gone fails; it never ends the host.
+  bool Written = true;
+  for (int Attempt = 0; Attempt < 500 && Written; ++Attempt) {
+    Written = Kernel.SendRequest("8-gdb-version");
+    YieldAndSleep(2);
+  }
+  EXPECT_FALSE(Written);
+}
+
+TEST(KernelWithGdb, LogsTheTrafficIntoANewNestedDirectory) {
+  TScratchDir Scratch;
+  const std::string LogDir = Scratch.Path() + "/one/two";
+  TScopedEnv Debug("GDB_DEBUG", "1");
+  TScopedEnv OutDir("GDB_OUTDIR", LogDir);
+  std::string LogFile;
+  {
+    TGDBKernel Kernel("", "");
+    ASSERT_TRUE(Kernel.Start());
+    LogFile = Kernel.GetLogFileName();
+    EXPECT_EQ(LogFile, LogDir + "/gdb_" + std::to_string(Kernel.GetProcessHandle()) + ".log");
+    std::string Reply;
+    ASSERT_TRUE(Kernel.GetReply(Reply));
+    ASSERT_TRUE(Kernel.SendRequest("42-gdb-version"));
+    ASSERT_TRUE(Kernel.GetReply(Reply));
+  }
+  const std::string Log = ReadWholeFile(LogFile);
+  // The command as sent, then the raw reply with its prompt.
+  EXPECT_NE(Log.find("42-gdb-version\n"), std::string::npos);
+  EXPECT_NE(Log.find("42^done\n(gdb) \n"), std::string::npos);
+}
+
+TEST(KernelWithGdb, KeepsNoLogWithoutGdbDebug) {
+  TScopedEnv Debug("GDB_DEBUG", "");
+  TGDBKernel Kernel("", "");
+  ASSERT_TRUE(Kernel.Start());
+  EXPECT_EQ(Kernel.GetLogFileName(), "");
+}
+
+TEST(KernelStartFailure, MissingProgramIsNamed) {
+  TGDBKernel Kernel("/no/such/dir/gdb", "");
+  EXPECT_FALSE(Kernel.Start());
+  EXPECT_EQ(Kernel.GetLastError(false), "Could not find program, '/no/such/dir/gdb'");
+  std::string Reply;
+  EXPECT_FALSE(Kernel.GetReply(Reply));
+  EXPECT_EQ(Kernel.GetLastError(true), "process exited");
+}
+
+TEST(KernelStartFailure, ProgramThatCannotRunGivesTheSystemsReason) {
+  TScratchDir Scratch;
+  const std::string NotExecutable = Scratch.WriteFile("gdb", "not a program");
+  chmod(NotExecutable.c_str(), 0644);
+  TGDBKernel Kernel(NotExecutable, "");
+  EXPECT_FALSE(Kernel.Start());
+  EXPECT_EQ(Kernel.GetLastError(false), "Unable to create process: Permission denied");
+}
+
+TEST_F(FakeDebuggerTest, ReplyOfExactlyTheBufferSizeKeepsReading) {
+  auto Kernel = StartFake("sendfill 2048 x\nsleep 20\nprompt\nwait-eof\n");
+  std::string Reply;
+  ASSERT_TRUE(Kernel->GetReply(Reply));
+  EXPECT_EQ(Reply, std::string(2048, 'x'));
+  EXPECT_EQ(Kernel->GetBufferSize(), 4096u);
+}
+
+TEST_F(FakeDebuggerTest, LongReplyShrinksTheBufferAfterwards) {
+  auto Kernel = StartFake("sendfill 100000 y\nprompt\nwait-eof\n");
+  std::string Reply;
+  ASSERT_TRUE(Kernel->GetReply(Reply));
+  EXPECT_EQ(Reply.size(), 100000u);
+  EXPECT_EQ(Kernel->GetBufferSize(), 2048u);
+}
+
+TEST_F(FakeDebuggerTest, MarkerInASecondReadEndsTheReply) {
+  auto Kernel = StartFake(ReadWholeFile(test::TestDataDir() + "/fakemi/split-marker.script"));
+  std::string Reply;
+  ASSERT_TRUE(Kernel->GetReply(Reply));
+  EXPECT_EQ(Reply, "");
+  ASSERT_TRUE(Kernel->SendRequest("0980000000003-gdb-version"));
+  ASSERT_TRUE(Kernel->GetReply(Reply));
+  EXPECT_EQ(Reply, "0980000000003^done\n");
+}
+
+TEST_F(FakeDebuggerTest, PromptInsideTheDataIsNotAnEnd) {
+  auto Kernel = StartFake("sendraw 1^done\\n(gdb) \\n=thread-created,id=\"1\"\\n\nsleep 20\nprompt\nwait-eof\n");
+  std::string Reply;
+  ASSERT_TRUE(Kernel->GetReply(Reply));
+  EXPECT_EQ(Reply, "1^done\n(gdb) \n=thread-created,id=\"1\"\n");
+}
+
+TEST_F(FakeDebuggerTest, BytesThatAreNotUtf8AreReadAsWindows1252) {
+  auto Kernel = StartFake("send ~\"caf\\xe9 \\x80 \\x9f\"\nsend ~\"\\xc3\\xa9\"\nprompt\nwait-eof\n");
+  std::string Reply;
+  ASSERT_TRUE(Kernel->GetReply(Reply));
+  EXPECT_EQ(Reply, "~\"caf\u00e9 \u20ac \u0178\"\n~\"\u00c3\u00a9\"\n");
+}
+
+TEST_F(FakeDebuggerTest, ValidUtf8PassesUnchanged) {
+  auto Kernel = StartFake("send ~\"\\xc3\\xa9\\xe2\\x82\\xac\"\nprompt\nwait-eof\n");
+  std::string Reply;
+  ASSERT_TRUE(Kernel->GetReply(Reply));
+  EXPECT_EQ(Reply, "~\"\u00e9\u20ac\"\n");
+}
+
+TEST_F(FakeDebuggerTest, DebuggerDyingMidReplyDeliversWhatItPrintedThenFails) {
+  auto Kernel = StartFake("sendraw ^done,partial\nexit 1\n");
+  std::string Reply;
+  ASSERT_TRUE(Kernel->GetReply(Reply));
+  EXPECT_EQ(Reply, "^done,partial");
+  EXPECT_FALSE(Kernel->GetReply(Reply));
+  EXPECT_EQ(Reply, "");
+  EXPECT_EQ(Kernel->GetLastError(true), "process exited");
+}
+
+TEST_F(FakeDebuggerTest, ClosedOutputOfALivingDebuggerEndsTheRead) {
+  auto Kernel = StartFake("close-output\nhang\n");
+  std::string Reply;
+  EXPECT_FALSE(Kernel->GetReply(Reply));
+  EXPECT_EQ(Kernel->GetLastError(true), "process exited");
+}
+
+TEST_F(FakeDebuggerTest, WritesEachCommandAsOneLine) {
+  auto Kernel = StartFake("expect 12-break-insert main\nsend 12^done\nprompt\nwait-eof\n");
+  ASSERT_TRUE(Kernel->SendRequest("12-break-insert main"));
+  std::string Reply;
+  ASSERT_TRUE(Kernel->GetReply(Reply));
+  EXPECT_EQ(Reply, "12^done\n");
+}
+
+TEST_F(FakeDebuggerTest, CommandFileIsPassedAndTheDebuggerRunsBesideIt) {
+  const std::string CommandFile = Scratch.WriteFile("start up.gdb", "");
+  ScriptEnv = std::make_unique<TScopedEnv>("FAKEMI_SCRIPT", Scratch.WriteFile("fake.script", "print-args\nprint-cwd\nprompt\nwait-eof\n"));
+  {
+    TGDBKernel Kernel(FakeDebuggerPath(), CommandFile);
+    EXPECT_EQ(Kernel.GetCommandLine(),
+              "\"" + FakeDebuggerPath() + "\" --nw --nx  --interpreter=mi2 -x \"" + CommandFile + "\"");
+    ASSERT_TRUE(Kernel.Start());
+    std::string Reply;
+    ASSERT_TRUE(Kernel.GetReply(Reply));
+    EXPECT_EQ(Reply, "--nw --nx --interpreter=mi2 -x " + CommandFile + "\n" + Scratch.Path() + "\n");
+  }
+  // The command file is the kernel's: it goes with it.
+  EXPECT_FALSE(std::filesystem::exists(CommandFile));
+}
+
+TEST_F(FakeDebuggerTest, DebuggerWithoutCommandFileRunsInItsOwnDirectory) {
+  auto Kernel = StartFake("print-cwd\nprompt\nwait-eof\n");
+  std::string Reply;
+  ASSERT_TRUE(Kernel->GetReply(Reply));
+  EXPECT_EQ(Reply, ExtractFileDir(FakeDebuggerPath()) + "\n");
+}
+
+TEST(KernelEndOfLineMarker, FollowsLineEndsAndDebuggerKind) {
+  TGDBKernel Gdb("", "");
+  TLLDBKernel Lldb("", "");
+  EXPECT_EQ(Gdb.GetCapabilities(), 179);
+  EXPECT_EQ(Lldb.GetCapabilities(), 32947);
+  EXPECT_EQ(Gdb.GetEndOfLineMarker(), "(gdb) \n");
+  EXPECT_EQ(Lldb.GetEndOfLineMarker(), "(gdb)\n");
+  Gdb.SetCapabilites(Gdb.GetCapabilities() | capCRLFLineEnds);
+  Lldb.SetCapabilites(Lldb.GetCapabilities() | capCRLFLineEnds);
+  EXPECT_EQ(Gdb.GetEndOfLineMarker(), "(gdb) \r\n");
+  EXPECT_EQ(Lldb.GetEndOfLineMarker(), "(gdb)\r\n");
+  EXPECT_EQ(Lldb.GetCommandFileOption(), "--source");
+}
+
+TEST_F(FakeDebuggerTest, LldbPromptEndsAReplyWithoutTheBlank) {
+  auto Kernel = StartFake<TLLDBKernel>("send ^done\nsendraw (gdb)\\n\nwait-eof\n");
+  std::string Reply;
+  ASSERT_TRUE(Kernel->GetReply(Reply));
+  EXPECT_EQ(Reply, "^done\n");
+}
+
+TEST_F(FakeDebuggerTest, LldbHandsOverAnUnfinishedReplyAfterFiveQuietSeconds) {
+  auto Kernel = StartFake<TLLDBKernel>("send ^done\nsendraw (gdb) \\n\nwait-eof\n");
+  std::string Reply;
+  ASSERT_TRUE(Kernel->GetReply(Reply));
+  EXPECT_EQ(Reply, "^done\n(gdb) \n");
+}
+
+/// A copy of the fake debugger under another file name.
+std::string InstallFakeAs(const TScratchDir& Dir, const std::string& Name) {
+  const std::string Path = Dir.Path() + "/" + Name;
+  std::filesystem::copy_file(FakeDebuggerPath(), Path);
+  return Path;
+}
+
+TEST_F(FakeDebuggerTest, LldbFrontEndForAWindowsTargetIsRecognisedByItsExactName) {
+  const std::string Script = "prompt\nwait-eof\n";
+  auto FrontEnd = std::make_unique<TLLDBKernel>(InstallFakeAs(Scratch, "lldb-mi"), "");
+  FrontEnd->FKernelType = ktLLDB | 4 | ktWindowsTarget;
+  ScriptEnv = std::make_unique<TScopedEnv>("FAKEMI_SCRIPT", Scratch.WriteFile("fake.script", Script));
+  ASSERT_TRUE(FrontEnd->Start());
+  EXPECT_TRUE(FrontEnd->IsWindows());
+  EXPECT_TRUE(FrontEnd->SupportStopOnEntryPoint());
+
+  auto OtherCase = std::make_unique<TLLDBKernel>(InstallFakeAs(Scratch, "LLDB-MI"), "");
+  OtherCase->FKernelType = ktLLDB | 4 | ktWindowsTarget;
+  ASSERT_TRUE(OtherCase->Start());
+  EXPECT_FALSE(OtherCase->IsWindows());
+}
+
+TEST(KernelLLDBInitFile, OnlyForWindowsOrAndroidAndOnlyWhenItExists) {
+  TScratchDir Root;
+  SetHostRootDirectory(Root.Path());
+  TGDBKernel Kernel("", "");
+  EXPECT_EQ(Kernel.GetLLDBInitFile(), "");
+  Kernel.SetCapabilites(Kernel.GetCapabilities() | capIsWindows);
+  EXPECT_EQ(Kernel.GetLLDBInitFile(), "");
+
+  std::filesystem::create_directories(Root.Path() + "/bin/windows/lldbx");
+  const std::string InitFile = Root.WriteFile("bin/windows/lldbx/.lldbinit", "");
+  EXPECT_EQ(Kernel.GetLLDBInitFile(), "");
+  Kernel.FKernelType |= ktWindowsX;
+  EXPECT_EQ(Kernel.GetLLDBInitFile(), InitFile);
+  SetHostRootDirectory("");
+}
+
+TEST(KernelTerminate, MinusOneKillsNothing) {
+  TGDBKernel Kernel("", "");
+  Kernel.Terminate(-1);
+  SUCCEED();
+}
+
+} // namespace
+} // namespace midebug
