@@ -68,24 +68,25 @@ namespace {
 
 /// Keeps SIGPIPE from this thread while it writes, and swallows the one a
 /// broken pipe raises, so that the write reports EPIPE instead of ending the
-/// host. The host's own signal disposition stays untouched.
+/// host. The host's own signal disposition stays untouched; when the thread
+/// already blocked SIGPIPE, the signal is the host's to collect.
 class TSigPipeGuard {
 public:
   TSigPipeGuard() {
     sigemptyset(&FPipeSet);
     sigaddset(&FPipeSet, SIGPIPE);
-    sigset_t Pending;
-    sigpending(&Pending);
-    FWasPending = sigismember(&Pending, SIGPIPE) == 1;
     pthread_sigmask(SIG_BLOCK, &FPipeSet, &FOldMask);
   }
   ~TSigPipeGuard() {
-    if (FBroken && !FWasPending) {
+    // The caller reads errno of the failed write after this has run.
+    const int WriteError = errno;
+    if (FBroken && sigismember(&FOldMask, SIGPIPE) == 0) {
       const timespec NoWait{0, 0};
       while (sigtimedwait(&FPipeSet, nullptr, &NoWait) < 0 && errno == EINTR) {
       }
     }
     pthread_sigmask(SIG_SETMASK, &FOldMask, nullptr);
+    errno = WriteError;
   }
   TSigPipeGuard(const TSigPipeGuard&) = delete;
   TSigPipeGuard& operator=(const TSigPipeGuard&) = delete;
@@ -94,7 +95,6 @@ public:
 private:
   sigset_t FPipeSet;
   sigset_t FOldMask;
-  bool FWasPending = false;
   bool FBroken = false;
 };
 

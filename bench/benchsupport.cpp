@@ -1,0 +1,52 @@
+#include "benchsupport.h"
+
+#include <benchmark/benchmark.h>
+
+#include <cstdio>
+#include <map>
+
+namespace midebug::bench {
+
+namespace {
+
+/// The console report, plus the real time per iteration of every run kept by
+/// benchmark name (the part of the name before the first "/").
+class TRecordingReporter : public benchmark::ConsoleReporter {
+public:
+  void ReportRuns(const std::vector<Run>& Runs) override {
+    for (const Run& Each : Runs) {
+      if (Each.error_occurred || Each.run_type != Run::RT_Iteration)
+        continue;
+      std::string Name = Each.benchmark_name();
+      Name = Name.substr(0, Name.find('/'));
+      FTimes[Name] = Each.GetAdjustedRealTime();
+    }
+    ConsoleReporter::ReportRuns(Runs);
+  }
+  const std::map<std::string, double>& Times() const { return FTimes; }
+
+private:
+  std::map<std::string, double> FTimes;
+};
+
+} // namespace
+
+int RunAndPrintRatios(int argc, char** argv, const std::vector<std::pair<std::string, std::string>>& Ratios) {
+  benchmark::Initialize(&argc, argv);
+  if (benchmark::ReportUnrecognizedArguments(argc, argv))
+    return 1;
+  TRecordingReporter Reporter;
+  benchmark::RunSpecifiedBenchmarks(&Reporter);
+  benchmark::Shutdown();
+  for (const auto& [Measured, Baseline] : Ratios) {
+    const auto MeasuredTime = Reporter.Times().find(Measured);
+    const auto BaselineTime = Reporter.Times().find(Baseline);
+    if (MeasuredTime == Reporter.Times().end() || BaselineTime == Reporter.Times().end() || BaselineTime->second <= 0)
+      continue;
+    std::printf("ratio %s / %s = %.3f\n", Measured.c_str(), Baseline.c_str(),
+                MeasuredTime->second / BaselineTime->second);
+  }
+  return 0;
+}
+
+} // namespace midebug::bench

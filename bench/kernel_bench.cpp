@@ -1,0 +1,103 @@
+// The kernel's round trip (write a command, read its reply block) against the
+// real GDB, beside a minimal loop doing the same with blocking pipe I/O.
+
+#include "benchsupport.h"
+#include "midebug.h"
+
+#include <benchmark/benchmark.h>
+
+#include <string>
+
+namespace midebug {
+namespace {
+
+/// A cheap command: GDB answers it at once with one short result record.
+constexpr const char* CheapCommand = "-gdb-show height";
+
+void BM_KernelRoundTrip(benchmark::State& State) {
+  TGDBKernel Kernel("", "");
+  if (!Kernel.Start()) {
+    State.SkipWithError(Kernel.GetLastError(false).c_str());
+    return;
+  }
+  std::string Reply;
+  Kernel.GetReply(Reply);
+  Cardinal Request = 0;
+  for (auto _ : State) {
+    Kernel.SendRequest(std::to_string(++Request) + CheapCommand);
+    if (!Kernel.GetReply(Reply)) {
+      State.SkipWithError("the debugger went away");
+      return;
+    }
+    benchmark::DoNotOptimize(Reply);
+  }
+}
+BENCHMARK(BM_KernelRoundTrip)->UseRealTime()->MinTime(2.0);
+
+/// GDB on two pipes, read with plain blocking reads until the prompt ends the
+/// bytes read so far.
+class TRawGdb {
+public:
+  bool Start() {
+    TChildProcess Child;
+    std::string Error;
+    if (!StartChildProcess(SplitCommandLine("gdb --nw --nx  --interpreter=mi2"), {}, FStdIn.ReadHandle(),
+                           FStdOut.WriteHandle(), Child, Error))
+      return false;
+    FPid = Child.Pid;
+    FStdIn.CloseRead();
+    FStdOut.CloseWrite();
+    return true;
+  }
+  ~TRawGdb() {
+    KillProcess(FPid);
+    ReapChildProcess(FPid);
+  }
+  bool Write(const std::string& Line) {
+    return WriteHandle(FStdIn.WriteHandle(), Line.data(), Line.size()) == static_cast<Int64>(Line.size());
+  }
+  bool ReadBlock(std::string& Block) {
+    static const std::string Prompt = "(gdb) \n";
+    Block.clear();
+    char Buffer[4096];
+    while (!Block.ends_with(Prompt)) {
+      const Int64 Read = ReadHandle(FStdOut.ReadHandle(), Buffer, sizeof Buffer);
+      if (Read <= 0)
+        return false;
+      Block.append(Buffer, static_cast<size_t>(Read));
+    }
+    return true;
+  }
+
+private:
+  TPipe FStdIn;
+  TPipe FStdOut;
+  Integer FPid = -1;
+};
+
+void BM_RawRoundTrip(benchmark::State& State) {
+  TRawGdb Gdb;
+  if (!Gdb.Start()) {
+    State.SkipWithError("cannot start gdb");
+    return;
+  }
+  std::string Block;
+  Gdb.ReadBlock(Block);
+  Cardinal Request = 0;
+  for (auto _ : State) {
+    Gdb.Write(std::to_string(++Request) + CheapCommand + "\n");
+    if (!Gdb.ReadBlock(Block)) {
+      State.SkipWithError("gdb went away");
+      return;
+    }
+    benchmark::DoNotOptimize(Block);
+  }
+}
+BENCHMARK(BM_RawRoundTrip)->UseRealTime()->MinTime(2.0);
+
+} // namespace
+} // namespace midebug
+
+int main(int argc, char** argv) {
+  return midebug::bench::RunAndPrintRatios(argc, argv, {{"BM_KernelRoundTrip", "BM_RawRoundTrip"}});
+}
