@@ -1,0 +1,852 @@
+#include "mi/gdbcommand.h"
+
+#include "mi/gdbresult.h"
+
+#include <algorithm>
+#include <array>
+#include <charconv>
+#include <cstdio>
+#include <cstring>
+#include <stdexcept>
+
+namespace midebug {
+
+namespace {
+
+constexpr std::array<std::string_view, MiCommandCount> MiCommandTexts = {
+    "",
+    "-break-after",
+    "-break-condition",
+    "-break-delete",
+    "-break-disable",
+    "-break-enable",
+    "-break-info",
+    "-break-insert",
+    "-break-list",
+    "-break-watch",
+    "-exec-arguments",
+    "-exec-show-arguments",
+    "-environment-cd",
+    "-environment-directory",
+    "-environment-path",
+    "-environment-pwd",
+    "-thread-info",
+    "-thread-list-ids",
+    "-thread-select",
+    "-exec-continue",
+    "-exec-finish",
+    "-exec-interrupt",
+    "-exec-next",
+    "-exec-next-instruction",
+    "-exec-return",
+    "-exec-run",
+    "-exec-step",
+    "-exec-step-instruction",
+    "-exec-until",
+    "-stack-info-frame",
+    "-stack-info-depth",
+    "-stack-list-arguments",
+    "-stack-list-frames",
+    "-stack-list-locals",
+    "-stack-select-frame",
+    "-var-create",
+    "-var-delete",
+    "-var-set-format",
+    "-var-show-format",
+    "-var-info-num-children",
+    "-var-list-children",
+    "-var-info-type",
+    "-var-info-expression",
+    "-var-info-path-expression",
+    "-var-show-attributes",
+    "-var-evaluate-expression",
+    "-var-assign",
+    "-var-update",
+    "-var-set-frozen",
+    "-data-disassemble",
+    "-data-evaluate-expression",
+    "-data-list-changed-registers",
+    "-data-list-register-names",
+    "-data-list-register-values",
+    "-data-write-register-values",
+    "-data-list-register-values",
+    "-data-write-register-values",
+    "-data-list-register-values",
+    "-data-write-register-values",
+    "-data-read-memory",
+    "-data-read-memory-bytes",
+    "-data-info-line",
+    "-symbol-info-address",
+    "-symbol-info-file",
+    "-symbol-info-function",
+    "-symbol-info-line",
+    "-symbol-info-symbol",
+    "-symbol-list-functions",
+    "-symbol-list-lines",
+    "-symbol-list-types",
+    "-symbol-list-variables",
+    "-symbol-locate",
+    "-symbol-type",
+    "-file-exec-and-symbols",
+    "-file-exec-file",
+    "-file-list-exec-sections",
+    "-file-list-exec-source-file",
+    "-file-list-exec-source-files",
+    "-file-list-shared-libraries",
+    "-file-list-symbol-files",
+    "-file-symbol-file",
+    "-target-attach",
+    "-target-compare-sections",
+    "-target-detach",
+    "-target-disconnect",
+    "-target-download",
+    "-target-exec-status",
+    "-target-list-available-targets",
+    "-target-list-current-targets",
+    "-target-list-parameters",
+    "-target-select",
+    "-target-file-put",
+    "-target-file-get",
+    "-target-file-delete",
+    "-gdb-exit",
+    "-exec-abort",
+    "-gdb-set",
+    "-gdb-show",
+    "-gdb-version",
+    "-list-features",
+    "-list-target-features",
+    "-list-thread-groups",
+    "-add-inferior",
+    "-interpreter-exec",
+    "-inferior-tty-set",
+    "-inferior-tty-show",
+    "-enable-timings",
+    "-pid-info",
+    "-target-info-async",
+    "-enable-debughook",
+    "info line",
+    "set variable",
+    "set environment",
+    "kill",
+    "handle",
+    "settings set target.env-vars",
+    "register write",
+    "settings set",
+    "settings show",
+    "process handle",
+    "thread select",
+    "command source",
+    "memory write",
+    "process attach",
+};
+
+struct TFormatNames {
+  std::string_view Word;
+  std::string_view Letter;
+};
+
+constexpr std::array<TFormatNames, 6> DataValueFormats = {{
+    {"hexadecimal", "x"},
+    {"octal", "o"},
+    {"binary", "t"},
+    {"decimal", "d"},
+    // The variable-object commands know no raw format; "r" is GDB's raw
+    // letter for registers and memory.
+    {"natural", "r"},
+    {"natural", "N"},
+}};
+
+constexpr std::array<std::string_view, 3> PrintValuesFormats = {"--no-values", "--all-values", "--simple-values"};
+
+// Platform names that change the register names of an AMD64 target.
+constexpr std::string_view PlatformWin64 = "Win64";
+constexpr std::string_view PlatformOSX64 = "OSX64";
+
+// -var-list-children with a range asks for children 0 to this number only, so
+// that a huge array does not stall the debugger.
+constexpr Integer MaxListedChildren = 5000;
+
+// x87 stack and SSE data registers are written as a brace list of their 16
+// bytes; the control registers behind them as one number.
+constexpr Integer FPUStackRegisterCount = 8;
+constexpr Integer XMMDataRegisterCount = 16;
+
+std::string UpperHex(UInt64 Value, Integer MinDigits) {
+  char Digits[17];
+  char* End = std::to_chars(std::begin(Digits), std::end(Digits), Value, 16).ptr;
+  std::string Text(std::begin(Digits), End);
+  std::transform(Text.begin(), Text.end(), Text.begin(), [](char Digit) {
+    return Digit >= 'a' && Digit <= 'f' ? static_cast<char>(Digit - 'a' + 'A') : Digit;
+  });
+  if (static_cast<Integer>(Text.size()) < MinDigits)
+    Text.insert(0, static_cast<std::size_t>(MinDigits) - Text.size(), '0');
+  return Text;
+}
+
+/// " 0xNN" for each of Count bytes.
+std::string ByteList(const Byte* Data, Integer Count) {
+  std::string List;
+  for (Integer Index = 0; Index < Count; ++Index)
+    List += " 0x" + UpperHex(Data[Index], 2);
+  return List;
+}
+
+/// Text as an MI c-string: in double quotes, with backslash and double quote
+/// escaped, so that GDB's argument splitter hands it over unchanged.
+std::string QuoteCString(std::string_view Text) {
+  std::string Quoted = "\"";
+  for (const char Character : Text) {
+    if (Character == '\\' || Character == '"')
+      Quoted += '\\';
+    Quoted += Character;
+  }
+  Quoted += '"';
+  return Quoted;
+}
+
+std::string DoubleBackslashes(std::string_view Text) {
+  std::string Doubled;
+  for (const char Character : Text) {
+    if (Character == '\\')
+      Doubled += '\\';
+    Doubled += Character;
+  }
+  return Doubled;
+}
+
+/// A CR or LF would end the line and let the rest run as a second command.
+std::string SingleLine(std::string Line) {
+  std::replace_if(Line.begin(), Line.end(), [](char Character) { return Character == '\r' || Character == '\n'; },
+                  ' ');
+  return Line;
+}
+
+std::string NumberList(const std::vector<Integer>& Numbers) {
+  std::string List;
+  for (const Integer Number : Numbers)
+    List += " " + std::to_string(Number);
+  return List;
+}
+
+std::string NameArgument(const std::string& Name, bool Quoted) {
+  return " " + (Quoted ? QuoteCString(Name) : Name);
+}
+
+/// Entry Id of Table; an id outside it is the caller's error, reported with
+/// the table's name rather than read past its end.
+template <std::size_t N>
+std::string_view RegisterName(const std::array<std::string_view, N>& Table, std::string_view TableName,
+                              Integer Id) {
+  if (Id < 0 || static_cast<std::size_t>(Id) >= N)
+    throw std::out_of_range("register id " + std::to_string(Id) + " is outside " + std::string(TableName) + " (" +
+                            std::to_string(N) + " entries)");
+  return Table[static_cast<std::size_t>(Id)];
+}
+
+UInt64 FirstInt64(const TXMMFPURegValue& Value) {
+  UInt64 Number;
+  std::memcpy(&Number, &Value, sizeof(Number));
+  return Number;
+}
+
+/// The 16 bytes, in memory order, as the brace list LLDB's register write reads.
+std::string RegisterByteList(const TXMMFPURegValue& Value) {
+  Byte Bytes[sizeof(TXMMFPURegValue)];
+  std::memcpy(Bytes, &Value, sizeof(Bytes));
+  return " \"{" + ByteList(Bytes, static_cast<Integer>(sizeof(Bytes))) + " }\"";
+}
+
+} // namespace
+
+std::string_view MiCommandText(TMiCommand Command) {
+  if (Command >= MiCommandTexts.size())
+    return {};
+  return MiCommandTexts[Command];
+}
+
+std::string_view DataValueFormatWord(TDataValueFormat Format) {
+  return Format < DataValueFormats.size() ? DataValueFormats[Format].Word : std::string_view();
+}
+
+std::string_view DataValueFormatLetter(TDataValueFormat Format) {
+  return Format < DataValueFormats.size() ? DataValueFormats[Format].Letter : std::string_view();
+}
+
+std::string_view PrintValuesFormatWord(TPrintValuesFormat Format) {
+  return Format < PrintValuesFormats.size() ? PrintValuesFormats[Format] : std::string_view();
+}
+
+bool IsProcessLaunchCommand(const std::string& Token) {
+  if (Token.size() != MiTokenLength)
+    return false;
+  int Ordinal = 0;
+  const char* OrdinalEnd = Token.data() + 3;
+  const auto [End, Error] = std::from_chars(Token.data(), OrdinalEnd, Ordinal);
+  if (Error != std::errc() || End != OrdinalEnd)
+    Ordinal = 0;
+  return Ordinal == ctExecRun;
+}
+
+bool XMMRegisterEqual(const TXMMFPURegValue& A, const TXMMFPURegValue& B) {
+  return std::memcmp(&A, &B, sizeof(TXMMFPURegValue)) == 0;
+}
+
+bool FPURegisterEqual(const TXMMFPURegValue& A, const TXMMFPURegValue& B) {
+  return std::memcmp(&A, &B, sizeof(TXMMFPURegValue)) == 0;
+}
+
+TGDBCommand::TGDBCommand(TGDBCPU CPU) : FAddressDigits(CPU == gcAMD64 || CPU == gcARM64 ? 16 : 8), FCPUType(CPU) {}
+
+std::string TGDBCommand::CreateMiCommand(TMiCommand Command, std::string& Token) {
+  ++FRequestId;
+  char Text[MiTokenLength + 1];
+  std::snprintf(Text, sizeof(Text), "%.3d%.10u", static_cast<int>(Command), static_cast<unsigned>(FRequestId));
+  Token = Text;
+  return Token + std::string(MiCommandText(Command));
+}
+
+std::string TGDBCommand::CreateCLCommand(TMiCommand Command) { return std::string(MiCommandText(Command)); }
+
+std::string TGDBCommand::FixupExpr(const std::string& Expr) {
+  std::string Fixed = SingleLine(Expr);
+  if (Fixed.empty())
+    return Fixed;
+  if (Fixed.front() == '+') {
+    Fixed.erase(0, 1);
+  } else if (Fixed.front() == '$') {
+    // Pascal writes hexadecimal numbers as $1F; the debugger wants 0x1F. Only
+    // a whole 64-bit number is rewritten, so $eax and $1+2 stay as they are.
+    UInt64 Number = 0;
+    const char* DigitsEnd = Fixed.data() + Fixed.size();
+    const auto [End, Error] = std::from_chars(Fixed.data() + 1, DigitsEnd, Number, 16);
+    if (Error == std::errc() && End == DigitsEnd)
+      Fixed.replace(0, 1, "0x");
+  }
+  if (Fixed.empty() || Fixed.front() == '*')
+    return Fixed;
+  return "\"" + Fixed + "\"";
+}
+
+std::string TGDBCommand::Hex(UInt64 Address) const { return "0x" + UpperHex(Address, FAddressDigits); }
+
+std::string TGDBCommand::MiLine(std::string& Token, TMiCommand Command, std::string_view Arguments) {
+  return SingleLine(CreateMiCommand(Command, Token) + std::string(Arguments));
+}
+
+std::string TGDBCommand::EchoedCLLine(std::string& Token, TMiCommand Command, std::string_view Arguments) {
+  std::string Line = CLLine(Command, Arguments);
+  // GDB echoes a CLI command in a log record as a c-string ending in "\n";
+  // the reply is recognised by that echo.
+  Token = Line + "\\n";
+  return Line;
+}
+
+std::string TGDBCommand::CLLine(TMiCommand Command, std::string_view Arguments) {
+  return SingleLine(CreateCLCommand(Command) + std::string(Arguments));
+}
+
+// Breakpoints
+
+std::string TGDBCommand::CreateBreakDeleteCommand(std::string& Token, const std::vector<Integer>& Numbers) {
+  return MiLine(Token, ctBreakDelete, NumberList(Numbers));
+}
+
+std::string TGDBCommand::CreateBreakDisableCommand(std::string& Token, const std::vector<Integer>& Numbers) {
+  return MiLine(Token, ctBreakDisable, NumberList(Numbers));
+}
+
+std::string TGDBCommand::CreateBreakEnableCommand(std::string& Token, const std::vector<Integer>& Numbers) {
+  return MiLine(Token, ctBreakEnable, NumberList(Numbers));
+}
+
+std::string TGDBCommand::CreateBreakInsertCommand(std::string& Token, const std::string& Location, bool Temporary,
+                                                  bool Pending) {
+  std::string Arguments;
+  if (Pending)
+    Arguments += " -f";
+  if (Temporary)
+    Arguments += " -t";
+  return MiLine(Token, ctBreakInsert, Arguments + " " + Location);
+}
+
+std::string TGDBCommand::CreateBreakInsertCommand(std::string& Token, const std::string& File, Integer Line,
+                                                  bool Temporary) {
+  return CreateBreakInsertCommand(Token, File + ":" + std::to_string(Line), Temporary, true);
+}
+
+std::string TGDBCommand::CreateBreakInsertCommand(std::string& Token, UInt64 Address, bool Temporary) {
+  return CreateBreakInsertCommand(Token, "*" + Hex(Address), Temporary, true);
+}
+
+std::string TGDBCommand::CreateBreakWatchCommand(std::string& Token, const std::string& Expr, bool ReadFlag,
+                                                 bool AccessFlag) {
+  // GDB takes the options only before the expression; behind it they are
+  // "garbage following <expression>".
+  std::string Option;
+  if (ReadFlag && !AccessFlag)
+    Option = " -r";
+  else if (AccessFlag && !ReadFlag)
+    Option = " -a";
+  return MiLine(Token, ctBreakWatch, Option + " " + Expr);
+}
+
+std::string TGDBCommand::CreateBreakWatchCommand(std::string& Token, UInt64 Address, bool ReadFlag,
+                                                 bool AccessFlag, bool PascalSyntax) {
+  // Pascal dereferences with a trailing "^", C with a leading "*".
+  const std::string Expr = PascalSyntax ? Hex(Address) + "^" : "*" + Hex(Address);
+  return CreateBreakWatchCommand(Token, Expr, ReadFlag, AccessFlag);
+}
+
+// Program arguments, environment and threads
+
+std::string TGDBCommand::CreateExecArgumentsCommand(std::string& Token, const std::string& Args, bool Escape) {
+  return MiLine(Token, ctExecArguments, " " + (Escape ? DoubleBackslashes(Args) : Args));
+}
+
+std::string TGDBCommand::CreateExecArgumentsCommand(std::string& Token, const std::vector<std::string>& Args,
+                                                    bool Escape) {
+  std::string Arguments;
+  for (const std::string& Arg : Args)
+    Arguments += " " + (Escape ? DoubleBackslashes(Arg) : Arg);
+  return MiLine(Token, ctExecArguments, Arguments);
+}
+
+std::string TGDBCommand::CreateEnvCdCommand(std::string& Token, const std::string& Dir) {
+  return MiLine(Token, ctEnvironmentCd, " " + QuoteCString(Dir));
+}
+
+std::string TGDBCommand::CreateEnvDirCommand(std::string& Token, const std::vector<std::string>& Dirs, bool Reset) {
+  std::string Arguments = Reset ? " -r" : "";
+  for (const std::string& Dir : Dirs)
+    Arguments += " " + Dir;
+  return MiLine(Token, ctEnvironmentDirectory, Arguments);
+}
+
+std::string TGDBCommand::CreateEnvPathCommand(std::string& Token, const std::vector<std::string>& Paths,
+                                              bool Reset) {
+  std::string Arguments = Reset ? " -r" : "";
+  for (const std::string& Path : Paths)
+    Arguments += " " + Path;
+  return MiLine(Token, ctEnvironmentPath, Arguments);
+}
+
+std::string TGDBCommand::CreateThreadInfoCommand(std::string& Token, Integer ThreadId) {
+  return MiLine(Token, ctThreadInfo, ThreadId == -1 ? "" : " " + std::to_string(ThreadId));
+}
+
+std::string TGDBCommand::CreateThreadListIdsCommand(std::string& Token) { return MiLine(Token, ctThreadListIds, ""); }
+
+std::string TGDBCommand::CreateThreadSelectCommand(std::string& Token, Integer ThreadId, bool UseCLI) {
+  const std::string Arguments = " " + std::to_string(ThreadId);
+  if (UseCLI)
+    return CLLine(ctCLThreadSelect, Arguments);
+  return MiLine(Token, ctThreadSelect, Arguments);
+}
+
+// Run control
+
+std::string TGDBCommand::CreateExecContinueCommand(std::string& Token) { return MiLine(Token, ctExecContinue, ""); }
+
+std::string TGDBCommand::CreateExecFinishCommand(std::string& Token) { return MiLine(Token, ctExecFinish, ""); }
+
+std::string TGDBCommand::CreateExecInterruptCommand(std::string& Token) {
+  return MiLine(Token, ctExecInterrupt, "");
+}
+
+std::string TGDBCommand::CreateExecNextCommand(std::string& Token) { return MiLine(Token, ctExecNext, ""); }
+
+std::string TGDBCommand::CreateExecNextInstructionCommand(std::string& Token) {
+  return MiLine(Token, ctExecNextInstruction, "");
+}
+
+std::string TGDBCommand::CreateExecReturnCommand(std::string& Token) { return MiLine(Token, ctExecReturn, ""); }
+
+std::string TGDBCommand::CreateExecStepCommand(std::string& Token) { return MiLine(Token, ctExecStep, ""); }
+
+std::string TGDBCommand::CreateExecStepInstructionCommand(std::string& Token) {
+  return MiLine(Token, ctExecStepInstruction, "");
+}
+
+std::string TGDBCommand::CreateExecRunCommand(std::string& Token, bool Start) {
+  return MiLine(Token, ctExecRun, Start ? " --start" : "");
+}
+
+std::string TGDBCommand::CreateExecUntilCommand(std::string& Token, const std::string& File, Integer Line) {
+  if (File.empty() || Line == -1)
+    return MiLine(Token, ctExecUntil, "");
+  return MiLine(Token, ctExecUntil, " " + File + ":" + std::to_string(Line));
+}
+
+// Stack
+
+std::string TGDBCommand::CreateStackInfoFrameCommand(std::string& Token) {
+  return MiLine(Token, ctStackInfoFrame, "");
+}
+
+std::string TGDBCommand::CreateStackInfoDepthCommand(std::string& Token, Integer MaxDepth) {
+  return MiLine(Token, ctStackInfoDepth, MaxDepth == -1 ? "" : " " + std::to_string(MaxDepth));
+}
+
+std::string TGDBCommand::CreateStackListArgumentsCommand(std::string& Token, bool NoValues, Integer Low,
+                                                         Integer High) {
+  std::string Arguments = NoValues ? " 0" : " 1";
+  if (Low != -1)
+    Arguments += " " + std::to_string(Low) + " " + std::to_string(High);
+  return MiLine(Token, ctStackListArguments, Arguments);
+}
+
+std::string TGDBCommand::CreateStackListFramesCommand(std::string& Token, Integer Low, Integer High) {
+  if (Low == -1)
+    return MiLine(Token, ctStackListFrames, "");
+  return MiLine(Token, ctStackListFrames, " " + std::to_string(Low) + " " + std::to_string(High));
+}
+
+std::string TGDBCommand::CreateStackListLocalsCommand(std::string& Token, TPrintValuesFormat PrintValues) {
+  return MiLine(Token, ctStackListLocals, " " + std::string(PrintValuesFormatWord(PrintValues)));
+}
+
+std::string TGDBCommand::CreateStackSelectFrameCommand(std::string& Token, Integer Level) {
+  return MiLine(Token, ctStackSelectFrame, " " + std::to_string(Level));
+}
+
+// Variable objects
+
+std::string TGDBCommand::CreateVarCreateCommand(std::string& Token, const std::string& Name,
+                                                const std::string& Expr, UInt64 Frame) {
+  const std::string FrameArgument = Frame != 0 ? " " + Hex(Frame) : " *";
+  return MiLine(Token, ctVarCreate, " " + Name + FrameArgument + " " + FixupExpr(Expr));
+}
+
+std::string TGDBCommand::CreateVarCreateCommand(std::string& Token, const std::string& Name, UInt64 Address,
+                                                UInt64 Frame) {
+  return CreateVarCreateCommand(Token, Name, "*" + Hex(Address), Frame);
+}
+
+std::string TGDBCommand::CreateVarDeleteCommand(std::string& Token, const std::string& Name, bool ChildrenOnly) {
+  return MiLine(Token, ctVarDelete, (ChildrenOnly ? " -c " : " ") + Name);
+}
+
+std::string TGDBCommand::CreateVarSetFormatCommand(std::string& Token, const std::string& Name,
+                                                   TDataValueFormat Format) {
+  return MiLine(Token, ctVarSetFormat, " " + Name + " " + std::string(DataValueFormatWord(Format)));
+}
+
+std::string TGDBCommand::CreateVarInfoNumChildrenCommand(std::string& Token, const std::string& Name) {
+  return MiLine(Token, ctVarInfoNumChildren, " " + Name);
+}
+
+std::string TGDBCommand::CreateVarInfoTypeCommand(std::string& Token, const std::string& Name) {
+  return MiLine(Token, ctVarInfoType, " " + Name);
+}
+
+std::string TGDBCommand::CreateVarInfoExpressionCommand(std::string& Token, const std::string& Name) {
+  return MiLine(Token, ctVarInfoExpression, " " + Name);
+}
+
+std::string TGDBCommand::CreateVarListChildrenCommand(std::string& Token, const std::string& Name, bool Ranged,
+                                                      bool Quoted, TPrintValuesFormat PrintValues) {
+  std::string Arguments;
+  if (PrintValues != pvfNoValues)
+    Arguments += " " + std::string(PrintValuesFormatWord(PrintValues));
+  Arguments += NameArgument(Name, Quoted);
+  if (Ranged)
+    Arguments += " 0 " + std::to_string(MaxListedChildren);
+  return MiLine(Token, ctVarListChildren, Arguments);
+}
+
+std::string TGDBCommand::CreateVarInfoPathExpressionCommand(std::string& Token, const std::string& Name,
+                                                            bool Quoted) {
+  return MiLine(Token, ctVarInfoPathExpression, NameArgument(Name, Quoted));
+}
+
+std::string TGDBCommand::CreateVarShowAttributesCommand(std::string& Token, const std::string& Name, bool Quoted) {
+  return MiLine(Token, ctVarShowAttributes, NameArgument(Name, Quoted));
+}
+
+std::string TGDBCommand::CreateVarEvaluateExpressionCommand(std::string& Token, const std::string& Name,
+                                                            bool Quoted, TDataValueFormat Format) {
+  std::string Arguments;
+  if (Format != dvfRaw)
+    Arguments += " -f " + std::string(DataValueFormatWord(Format));
+  return MiLine(Token, ctVarEvaluateExpression, Arguments + NameArgument(Name, Quoted));
+}
+
+std::string TGDBCommand::CreateVarAssignCommand(std::string& Token, const std::string& Name,
+                                                const std::string& TypeName, const std::string& Value,
+                                                bool IsLLDB) {
+  // GDB splits MI arguments at blanks, so ' ' would arrive as two arguments.
+  // Inside an MI c-string the literal survives with its quotes: GDB unwraps
+  // the c-string and evaluates 'x'. Without its single quotes it would read x
+  // as a variable name.
+  const bool IsCharLiteral = Value.size() >= 2 && Value.front() == '\'' && Value.back() == '\'';
+  const std::string Assigned = !IsLLDB && TypeName == "char" && IsCharLiteral ? QuoteCString(Value) : Value;
+  return MiLine(Token, ctVarAssign, " " + Name + " " + Assigned);
+}
+
+std::string TGDBCommand::CreateVarUpdateCommand(std::string& Token, const std::string& Name,
+                                                TPrintValuesFormat PrintValues) {
+  std::string Arguments;
+  if (PrintValues != pvfNoValues)
+    Arguments += " " + std::string(PrintValuesFormatWord(PrintValues));
+  return MiLine(Token, ctVarUpdate, Arguments + " " + Name);
+}
+
+// Disassembly, expressions, registers, memory
+
+std::string TGDBCommand::CreateDataDisassembleCommand(std::string& Token, UInt64 StartAddr, UInt64 EndAddr,
+                                                      Integer Mode) {
+  return MiLine(Token, ctDataDisassemble,
+                " -s " + Hex(StartAddr) + " -e " + Hex(EndAddr) + " -- " + std::to_string(Mode));
+}
+
+std::string TGDBCommand::CreateDataDisassembleCommand(std::string& Token, UInt64 StartAddr, Integer Count,
+                                                      Integer Mode) {
+  return MiLine(Token, ctDataDisassemble,
+                " -s " + Hex(StartAddr) + " -n " + std::to_string(Count) + " -- " + std::to_string(Mode));
+}
+
+std::string TGDBCommand::CreateDataDisassembleCommand(std::string& Token, const std::string& File, Integer Line,
+                                                      Integer Count, Integer Mode) {
+  return MiLine(Token, ctDataDisassemble,
+                " -f " + File + " -l " + std::to_string(Line) + " -n " + std::to_string(Count) + " -- " +
+                    std::to_string(Mode));
+}
+
+std::string TGDBCommand::CreateDataEvaluateExpressionCommand(std::string& Token, const std::string& Expr) {
+  return MiLine(Token, ctDataEvaluateExpression, " " + FixupExpr(Expr));
+}
+
+std::string TGDBCommand::CreateDataListRegisterNames(std::string& Token, const std::vector<Integer>& Ids) {
+  return MiLine(Token, ctDataListRegisterNames, NumberList(Ids));
+}
+
+std::string TGDBCommand::DataListRegisterValues(std::string& Token, TMiCommand Command,
+                                                const std::vector<Integer>& Ids, TDataValueFormat Format) {
+  return MiLine(Token, Command, " " + std::string(DataValueFormatLetter(Format)) + NumberList(Ids));
+}
+
+std::string TGDBCommand::DataListRegisterValues(std::string& Token, TMiCommand Command, Integer Id,
+                                                TDataValueFormat Format) {
+  return MiLine(Token, Command, " " + std::string(DataValueFormatLetter(Format)) + " " + std::to_string(Id));
+}
+
+std::string TGDBCommand::CreateDataListRegisterValues(std::string& Token, const std::vector<Integer>& Ids,
+                                                      TDataValueFormat Format) {
+  return DataListRegisterValues(Token, ctDataListRegisterValues, Ids, Format);
+}
+
+std::string TGDBCommand::CreateDataListRegisterValues(std::string& Token, Integer Id, TDataValueFormat Format) {
+  return DataListRegisterValues(Token, ctDataListRegisterValues, Id, Format);
+}
+
+std::string TGDBCommand::CreateDataListXMMRegisterValues(std::string& Token, const std::vector<Integer>& Ids,
+                                                         TDataValueFormat Format) {
+  return DataListRegisterValues(Token, ctDataListXMMRegisterValues, Ids, Format);
+}
+
+std::string TGDBCommand::CreateDataListXMMRegisterValues(std::string& Token, Integer Id, TDataValueFormat Format) {
+  return DataListRegisterValues(Token, ctDataListXMMRegisterValues, Id, Format);
+}
+
+std::string TGDBCommand::CreateDataListFPURegisterValues(std::string& Token, const std::vector<Integer>& Ids,
+                                                         TDataValueFormat Format) {
+  return DataListRegisterValues(Token, ctDataListFPURegisterValues, Ids, Format);
+}
+
+std::string TGDBCommand::CreateDataListFPURegisterValues(std::string& Token, Integer Id, TDataValueFormat Format) {
+  return DataListRegisterValues(Token, ctDataListFPURegisterValues, Id, Format);
+}
+
+std::string TGDBCommand::CreateDataWriteRegisterValues(std::string& /*Token*/, const std::string& Name,
+                                                       UInt64 Value) {
+  return CLLine(ctCLRegisterWrite, " " + Name + " " + Hex(Value));
+}
+
+std::string TGDBCommand::CreateDataWriteRegisterValues(std::string& Token, Integer Id, UInt64 Value,
+                                                       const std::string& Platform) {
+  // The id is a position in the table the register view of this CPU shows,
+  // so the name must come from that same table: on ARM32, AMD64's r10 at
+  // position 8 would overwrite the wrong register.
+  std::string_view Name;
+  switch (FCPUType) {
+  case gcIA32:
+    Name = RegisterName(IA32Registers, "IA32Registers", Id);
+    break;
+  case gcARM32:
+    Name = RegisterName(ARM32Registers, "ARM32Registers", Id);
+    break;
+  case gcARM64:
+    Name = RegisterName(ARM64Registers, "ARM64Registers", Id);
+    break;
+  case gcAMD64:
+    Name = Platform == PlatformWin64 ? RegisterName(winAMD64Registers, "winAMD64Registers", Id)
+                                     : RegisterName(AMD64Registers, "AMD64Registers", Id);
+    break;
+  }
+  return CreateDataWriteRegisterValues(Token, std::string(Name), Value);
+}
+
+std::string TGDBCommand::CreateDataWriteXMMRegisterValues(std::string& /*Token*/, Integer Id,
+                                                          const TXMMFPURegValue& Value) {
+  const std::string Name(RegisterName(AMD64XMMRegisters, "AMD64XMMRegisters", Id));
+  if (Id < XMMDataRegisterCount)
+    return CLLine(ctCLRegisterWrite, " " + Name + RegisterByteList(Value));
+  return CLLine(ctCLRegisterWrite, " " + Name + " 0x" + UpperHex(FirstInt64(Value), 16));
+}
+
+std::string TGDBCommand::CreateDataWriteFPURegisterValues(std::string& /*Token*/, Integer Id,
+                                                          const TXMMFPURegValue& Value,
+                                                          const std::string& Platform) {
+  const std::string Name(Platform == PlatformOSX64
+                             ? RegisterName(macAMD64FPURegisters, "macAMD64FPURegisters", Id)
+                             : RegisterName(AMD64FPURegisters, "AMD64FPURegisters", Id));
+  if (Id < FPUStackRegisterCount)
+    return CLLine(ctCLRegisterWrite, " " + Name + RegisterByteList(Value));
+  return CLLine(ctCLRegisterWrite, " " + Name + " 0x" + UpperHex(FirstInt64(Value), 16));
+}
+
+std::string TGDBCommand::CreateDataReadMemoryCommand(std::string& Token, UInt64 Address, Integer Count,
+                                                     bool UseBytes, Int64 Offset, TDataValueFormat Format,
+                                                     Integer WordSize, Integer Rows, char AsChar) {
+  if (UseBytes)
+    return CreateDataReadMemoryBytesCommand(Token, Address, Count, Offset);
+  std::string Arguments;
+  if (Offset != 0)
+    Arguments += " -o " + std::to_string(Offset);
+  Arguments += " " + Hex(Address) + " " + std::string(DataValueFormatLetter(Format)) + " " +
+               std::to_string(WordSize) + " " + std::to_string(Rows) + " " + std::to_string(Count);
+  if (AsChar != '\0')
+    Arguments += std::string(" ") + AsChar;
+  return MiLine(Token, ctDataReadMemory, Arguments);
+}
+
+std::string TGDBCommand::CreateDataReadMemoryBytesCommand(std::string& Token, UInt64 Address, Integer Count,
+                                                          Int64 Offset) {
+  std::string Arguments;
+  if (Offset != 0)
+    Arguments += " -o " + std::to_string(Offset);
+  return MiLine(Token, ctDataReadMemoryBytes, Arguments + " " + Hex(Address) + " " + std::to_string(Count));
+}
+
+std::string TGDBCommand::CreateDataWriteMemoryBytesCommand(std::string& Token, UInt64 Address, const Byte* Data,
+                                                           Integer Count) {
+  const std::string Bytes = Data != nullptr ? ByteList(Data, Count) : "";
+  return MiLine(Token, ctCLMemoryWrite, " " + Hex(Address) + " -s 1" + Bytes);
+}
+
+std::string TGDBCommand::CreateDataInfoLineCommand(std::string& Token, const std::string& File, Integer Line) {
+  return MiLine(Token, ctDataInfoLine, " " + File + ":" + std::to_string(Line));
+}
+
+std::string TGDBCommand::CreateDataInfoLineCommand(std::string& Token, UInt64 Address) {
+  return MiLine(Token, ctDataInfoLine, " *" + Hex(Address));
+}
+
+std::string TGDBCommand::CreateSymbolListLinesCommand(std::string& Token, const std::string& File, Integer Start,
+                                                      Integer Count) {
+  std::string Arguments = " " + File;
+  if (Start != -1)
+    Arguments += " --start " + std::to_string(Start) + " --count " + std::to_string(Count);
+  return MiLine(Token, ctSymbolListLines, Arguments);
+}
+
+// Program, target and debugger
+
+std::string TGDBCommand::CreateFileExecAndSymbolsCommand(std::string& Token, const std::string& File) {
+  return MiLine(Token, ctFileExecAndSymbols, " " + QuoteCString(File));
+}
+
+std::string TGDBCommand::CreateFileListExecSourceFileCommand(std::string& Token) {
+  return MiLine(Token, ctFileListExecSourceFile, "");
+}
+
+std::string TGDBCommand::CreateTargetAttachCommand(std::string& Token, Integer Pid, bool UseCLI) {
+  if (UseCLI)
+    return CLLine(ctCLProcessAttach, " --pid " + std::to_string(Pid));
+  return MiLine(Token, ctTargetAttach, " " + std::to_string(Pid));
+}
+
+std::string TGDBCommand::CreateTargetAttachCommand(std::string& Token, const std::string& Name) {
+  return MiLine(Token, ctTargetAttach, " " + Name);
+}
+
+std::string TGDBCommand::CreateTargetDetachCommand(std::string& Token) { return MiLine(Token, ctTargetDetach, ""); }
+
+std::string TGDBCommand::CreateGDBExitCommand(std::string& Token) { return MiLine(Token, ctGdbExit, ""); }
+
+std::string TGDBCommand::CreateExecAbortCommand(std::string& Token) { return MiLine(Token, ctExecAbort, ""); }
+
+std::string TGDBCommand::CreatePidInfoCommand(std::string& Token) { return MiLine(Token, ctPidInfo, ""); }
+
+std::string TGDBCommand::CreateTargetInfoAsyncCommand(std::string& Token) {
+  return MiLine(Token, ctTargetInfoAsync, "");
+}
+
+std::string TGDBCommand::CreateGDBSetCommand(std::string& Token, const std::string& Name, const std::string& Value) {
+  return MiLine(Token, ctGdbSet, " " + Name + " " + Value);
+}
+
+std::string TGDBCommand::CreateGDBShowCommand(std::string& Token, const std::string& Name) {
+  return MiLine(Token, ctGdbShow, " " + Name);
+}
+
+std::string TGDBCommand::CreateEnableTimingsCommand(std::string& Token, const std::string& Value) {
+  return MiLine(Token, ctEnableTimings, " " + Value);
+}
+
+std::string TGDBCommand::CreateEnableDebugHookCommand(std::string& Token, const std::string& Value) {
+  return MiLine(Token, ctEnableDebugHook, " " + Value);
+}
+
+std::string TGDBCommand::CreateInterpreterExecCommand(std::string& Token, TMiCommand Command) {
+  return MiLine(Token, ctInterpreterExec, " console " + CreateCLCommand(Command));
+}
+
+// CLI commands answered through GDB's echo of the line
+
+std::string TGDBCommand::CreateCLInfoLineAddressCommand(std::string& Token, const std::string& File, Integer Line) {
+  return EchoedCLLine(Token, ctCLInfoLineAddress, " " + File + ":" + std::to_string(Line));
+}
+
+std::string TGDBCommand::CreateCLSetVariableCommand(std::string& Token, const std::string& Name,
+                                                    const std::string& Value) {
+  return EchoedCLLine(Token, ctCLSetVariable, " " + Name + " = " + Value);
+}
+
+std::string TGDBCommand::CreateCLSetVariableCommand(std::string& Token, const std::string& Name, UInt64 Value) {
+  return EchoedCLLine(Token, ctCLSetVariable, " " + Name + " = " + Hex(Value));
+}
+
+std::string TGDBCommand::CreateCLSetEnvironmentCommand(std::string& Token, const std::string& Name,
+                                                       const std::string& Value, bool IsLLDB) {
+  if (IsLLDB)
+    return EchoedCLLine(Token, ctCLSetTargetEnvironment, " " + Name + "=" + Value);
+  return EchoedCLLine(Token, ctCLSetEnvironment, " " + Name + " = " + Value);
+}
+
+std::string TGDBCommand::CreateCLKillCommand(std::string& Token) { return EchoedCLLine(Token, ctCLKill, ""); }
+
+std::string TGDBCommand::CreateCLHandleCommand(std::string& Token, const std::string& Signal, bool Stop, bool Pass,
+                                               bool IsLLDB) {
+  if (IsLLDB)
+    return EchoedCLLine(Token, ctCLProcessHandle,
+                        std::string(Stop ? " -s true" : " -s false") + (Pass ? " -p true" : " -p false") + " " +
+                            Signal);
+  return EchoedCLLine(Token, ctCLHandle,
+                      " " + Signal + (Stop ? " stop" : " nostop") + (Pass ? " pass" : " nopass"));
+}
+
+std::string TGDBCommand::CreateCLSettingsSetCommand(std::string& Token, const std::string& Name,
+                                                    const std::string& Value) {
+  return EchoedCLLine(Token, ctCLSettingsSet, " " + Name + " " + Value);
+}
+
+std::string TGDBCommand::CreateCLSettingsShowCommand(std::string& Token, const std::string& Name) {
+  return EchoedCLLine(Token, ctCLSettingsShow, " " + Name);
+}
+
+std::string TGDBCommand::CreateCLCommandSourceCommand(std::string& Token, const std::string& File) {
+  return EchoedCLLine(Token, ctCLCommandSource, " " + QuoteCString(File));
+}
+
+} // namespace midebug
