@@ -6,6 +6,7 @@
 
 #include <benchmark/benchmark.h>
 
+#include <chrono>
 #include <string>
 
 namespace midebug {
@@ -94,6 +95,45 @@ void BM_RawRoundTrip(benchmark::State& State) {
   }
 }
 BENCHMARK(BM_RawRoundTrip)->UseRealTime()->MinTime(2.0);
+
+/// Both round trips in turn, each timed on its own: a load that comes and
+/// goes on a shared machine then falls on both alike.
+void BM_InterleavedRoundTrips(benchmark::State& State) {
+  TGDBKernel Kernel("", "");
+  TRawGdb Gdb;
+  if (!Kernel.Start() || !Gdb.Start()) {
+    State.SkipWithError("cannot start gdb");
+    return;
+  }
+  std::string Reply;
+  Kernel.GetReply(Reply);
+  Gdb.ReadBlock(Reply);
+  using TClock = std::chrono::steady_clock;
+  TClock::duration KernelTime{};
+  TClock::duration RawTime{};
+  Cardinal Request = 0;
+  for (auto _ : State) {
+    const std::string Line = std::to_string(++Request) + CheapCommand;
+    const TClock::time_point KernelStart = TClock::now();
+    Kernel.SendRequest(Line);
+    const bool KernelRead = Kernel.GetReply(Reply);
+    const TClock::time_point RawStart = TClock::now();
+    Gdb.Write(Line + "\n");
+    const bool RawRead = Gdb.ReadBlock(Reply);
+    const TClock::time_point RawEnd = TClock::now();
+    if (!KernelRead || !RawRead) {
+      State.SkipWithError("gdb went away");
+      return;
+    }
+    KernelTime += RawStart - KernelStart;
+    RawTime += RawEnd - RawStart;
+  }
+  const double Iterations = static_cast<double>(State.iterations());
+  State.counters["kernel_us"] = std::chrono::duration<double, std::micro>(KernelTime).count() / Iterations;
+  State.counters["raw_us"] = std::chrono::duration<double, std::micro>(RawTime).count() / Iterations;
+  State.counters["kernel/raw"] = static_cast<double>(KernelTime.count()) / static_cast<double>(RawTime.count());
+}
+BENCHMARK(BM_InterleavedRoundTrips)->UseRealTime()->MinTime(1.0)->Repetitions(5)->ReportAggregatesOnly(true);
 
 } // namespace
 } // namespace midebug
