@@ -13,3 +13,4 @@
 #include "platform/hostthread.h"
 #include "platform/textencoding.h"
 #include "platform/types.h"
+#include "process/gdbinterfaces.h"
