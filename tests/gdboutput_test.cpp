@@ -1,0 +1,548 @@
+/// \file
+/// The parser of the debugger's output: record classification, completion of
+/// requests, stop and notification records, streams and program output, and
+/// the value scanner underneath. Record texts are GDB 13.1 output captured
+/// from a small threaded C program built with gcc -g.
+
+#include "mi/gdboutput.h"
+#include "recordingprocess.h"
+
+#include <gtest/gtest.h>
+
+#include <random>
+#include <string>
+#include <vector>
+
+using namespace midebug;
+using midebug::test::TRecordingProcess;
+
+namespace {
+
+using TCalls = std::vector<std::string>;
+
+TCalls Parse(const std::string& Block, TRecordingProcess& Process) {
+  ProcessGDBOutput(Block, Process);
+  return Process.Calls;
+}
+
+TCalls Parse(const std::string& Block) {
+  TRecordingProcess Process;
+  return Parse(Block, Process);
+}
+
+// Log kinds as the recording process prints them.
+std::string LogUnknown(const std::string& Data) { return "Log(0," + Data + ")"; }
+std::string LogError(const std::string& Data) { return "Log(1," + Data + ")"; }
+std::string LogConsole(const std::string& Data) { return "Log(2," + Data + ")"; }
+
+// --- Scanner ----------------------------------------------------------------
+
+TEST(ParserScanner, CStringUnescapesOnlyQuotes) {
+  struct TCase {
+    std::string Input;
+    std::string Value;
+    std::string RestAfter;
+  } Cases[] = {
+      {R"("a\"b\"c",x)", R"(a"b"c)", ",x"},
+      {R"("line\n")", R"(line\n)", ""},
+      {R"("C:\\dir\\")", R"(C:\\dir\\)", ""},
+      {R"("\"a\\\"b\"")", R"("a\\"b")", ""}, // GDB 13: -data-evaluate-expression "\"a\\\"b\""
+      {R"("unterminated)", "", ""},
+      {R"("ends in backslash\)", "", ""},
+      {"x\"no\"", "", "x\"no\""},
+  };
+  for (const TCase& Case : Cases) {
+    TMIScanner Scanner(Case.Input);
+    EXPECT_EQ(Scanner.ReadCString(), Case.Value) << Case.Input;
+    EXPECT_EQ(Scanner.Rest(), Case.RestAfter) << Case.Input;
+  }
+}
+
+TEST(ParserScanner, FindValueConsumesOnlyTheFirstResult) {
+  TMIScanner Scanner(R"(x="1",y="2")");
+  EXPECT_EQ(Scanner.FindValue("y"), "2");
+  EXPECT_EQ(Scanner.Pos(), 0u) << "a later result is found without moving";
+  EXPECT_EQ(Scanner.FindValue("x"), "1");
+  EXPECT_EQ(Scanner.Rest(), R"(y="2")") << "the first result is consumed";
+  EXPECT_EQ(Scanner.FindValue("missing"), "");
+  EXPECT_EQ(Scanner.Rest(), R"(y="2")");
+}
+
+TEST(ParserScanner, FindValueWalksARunOfSameNamedResults) {
+  TMIScanner Scanner(R"(frame={level="0"},frame={level="1"},frame={level="2"})");
+  std::vector<std::string> Frames;
+  for (std::string_view Frame = Scanner.FindValue("frame"); !Frame.empty(); Frame = Scanner.FindValue("frame"))
+    Frames.emplace_back(Frame);
+  EXPECT_EQ(Frames, (std::vector<std::string>{R"(level="0")", R"(level="1")", R"(level="2")"}));
+}
+
+TEST(ParserScanner, ValuesOfEveryShape) {
+  struct TCase {
+    std::string Input;
+    std::string Value;
+  } Cases[] = {
+      {R"(v={a="1",b=[{c="2"}]})", R"(a="1",b=[{c="2"}])"},
+      {R"(v=["i1","i2"])", R"("i1","i2")"},
+      {R"(v=[frame={level="0"},frame={level="1"}])", R"(frame={level="0"},frame={level="1"})"},
+      {"v={}", ""},
+      {"v=[]", ""},
+      {"v= 12", "12"},
+      {"v= {0x1, 0x2}", "0x1, 0x2"},
+      {"v= -1", ""},
+      {R"(v={a="1")", ""},
+      {R"(v=[ "x")", ""},
+  };
+  for (const TCase& Case : Cases) {
+    TMIScanner Scanner(Case.Input);
+    EXPECT_EQ(Scanner.FindValue("v"), Case.Value) << Case.Input;
+  }
+}
+
+TEST(ParserScanner, FirstKeyInAListOfTuplesCarriesTheBrace) {
+  TMIScanner Scanner(R"({name="v",value="1"},{name="w",value="2"})");
+  EXPECT_EQ(Scanner.FindValue("name"), "");
+  EXPECT_EQ(Scanner.FindValue("value"), "1");
+}
+
+TEST(ParserScanner, NumbersFollowTheProtocolsConverter) {
+  EXPECT_EQ(MIStrToIntDef("12", -1), 12);
+  EXPECT_EQ(MIStrToIntDef("  -7", 0), -7);
+  EXPECT_EQ(MIStrToIntDef("$ff", 0), 255);
+  EXPECT_EQ(MIStrToIntDef("0xFFFFFFFF", 0), -1);
+  EXPECT_EQ(MIStrToIntDef("1.2", -1), -1);
+  EXPECT_EQ(MIStrToIntDef("", -1), -1);
+  EXPECT_EQ(MIStrToIntDef("2147483648", -1), -1);
+  EXPECT_EQ(MIStrToIntDef("i1", 0), 0);
+  EXPECT_EQ(MIStrToUInt64Def("0x0000555555555190", 0), 0x555555555190u);
+  EXPECT_EQ(MIStrToUInt64Def("0xffffffffffffffff", 0), ~UInt64{0});
+  EXPECT_EQ(MIStrToUInt64Def("0x1ffffffffffffffff", 7), 7u);
+  EXPECT_EQ(MIStrToUInt64Def("<MULTIPLE>", 0), 0u);
+}
+
+TEST(ParserScanner, LongListsScanInOnePass) {
+  std::string Children = "numchild=\"5000\",children=[";
+  for (int I = 0; I < 5000; ++I)
+    Children += (I ? "," : "") + std::string(R"(child={name="var1.)") + std::to_string(I) +
+                R"(",exp=")" + std::to_string(I) + R"(",numchild="0",type="int"})";
+  Children += "]";
+  TMIScanner Scanner(Children);
+  const std::string_view List = Scanner.FindValue("children");
+  TMIScanner::TNestedScan Nested(Scanner, List);
+  int Count = 0;
+  while (!Scanner.FindValue("child").empty())
+    ++Count;
+  EXPECT_EQ(Count, 5000);
+}
+
+// --- Garbage never crashes or hangs ------------------------------------------
+
+TEST(ParserGarbage, AnyBytesAreSafe) {
+  std::vector<std::string> Blocks = {
+      "",
+      "\n\n\r\n",
+      "^",
+      "1234",
+      "~\"unterminated",
+      "*stopped,",
+      "*stopped,reason=\"breakpoint-hit\",frame={addr=",
+      "=library-loaded,ranges=[{from=",
+      "&\"\\",
+      std::string("^done,\0x=\"1\"\n~\"after nul\"\n", 26),
+      std::string(100000, '{'),
+      "x=" + std::string(100000, '['),
+      std::string(50000, '"'),
+      "*stopped,reason=\"x\",a=" + std::string(100000, '{') + "b=\"1\"" + std::string(100000, '}'),
+      "*stopped,reason=\"x\",a=" + std::string(100000, '['),
+  };
+  std::mt19937 Random(12345);
+  for (int I = 0; I < 300; ++I) {
+    std::string Block(Random() % 200, '\0');
+    for (char& Byte : Block)
+      Byte = "^*+=~@&,{}[]\"\\=\n\r 0123abc"[Random() % 26];
+    Blocks.push_back(Block);
+  }
+  for (const std::string& Block : Blocks) {
+    TRecordingProcess Process;
+    TCLKillResult Waiting;
+    Process.Register("1", Waiting);
+    ProcessGDBOutput(Block, Process);
+  }
+  EXPECT_EQ(Parse(""), TCalls{});
+}
+
+TEST(ParserGarbage, NulByteDoesNotEndTheBlock) {
+  const TCalls Calls = Parse(std::string("abc\0def\n=thread-exited,id=\"2\"\n", 30));
+  ASSERT_EQ(Calls.size(), 2u);
+  EXPECT_EQ(Calls[1], "ThreadExited(2)");
+}
+
+// --- Result records ------------------------------------------------------------
+
+TEST(ParserResults, DoneDecodesAndCompletes) {
+  TRecordingProcess Process;
+  TStackInfoDepthResult Depth;
+  Depth.FError = true;
+  Process.Register("1030000000004", Depth);
+  EXPECT_EQ(Parse("1030000000004^done,depth=\"2\"\n", Process), TCalls{});
+  EXPECT_TRUE(Depth.FAvailable);
+  EXPECT_FALSE(Depth.FError);
+  EXPECT_EQ(Depth.FStackDepth, 2);
+}
+
+TEST(ParserResults, DoneWithResultsForACommandWithoutDecoderFails) {
+  TRecordingProcess Process;
+  TVarEvaluateExpressionResult Delete; // stands for any command without a decoder
+  Delete.FCommand = ctVarDelete;
+  Process.Register("7", Delete);
+  Parse("7^done,ndeleted=\"1\"\n", Process);
+  EXPECT_TRUE(Delete.FAvailable);
+  EXPECT_TRUE(Delete.FError);
+}
+
+TEST(ParserResults, DoneWithoutRegisteredTokenCompletesNothing) {
+  TRecordingProcess Process;
+  TStackInfoDepthResult Depth;
+  Process.Register("2", Depth);
+  EXPECT_EQ(Parse("1^done,depth=\"2\"\n^done\n", Process), TCalls{});
+  EXPECT_FALSE(Depth.FAvailable);
+}
+
+TEST(ParserResults, ErrorRecordCompletesWithMessage) {
+  TRecordingProcess Process;
+  TStackInfoDepthResult Depth;
+  Process.Register("2004", Depth);
+  EXPECT_EQ(Parse("2004^error,msg=\"No registers.\"\n", Process), TCalls{});
+  EXPECT_TRUE(Depth.FAvailable);
+  EXPECT_TRUE(Depth.FError);
+  EXPECT_EQ(Depth.FErrorMessage, "No registers.");
+}
+
+TEST(ParserResults, ErrorWithoutWaiterIsAFaultOrALaunchFailure) {
+  struct TCase {
+    std::string Block;
+    TCalls Calls;
+  } Cases[] = {
+      {"^error,msg=\"The program is not being run.\"\n",
+       {LogError("The program is not being run."), "Faulted(The program is not being run.)"}},
+      {"99^error,msg=\"Undefined MI command: bogus-command\",code=\"undefined-command\"\n",
+       {LogError("Undefined MI command: bogus-command"), "Faulted(Undefined MI command: bogus-command)"}},
+      {"^error,message=\"other key\"\n", {LogError("other key"), "Faulted(other key)"}},
+      {"^error\n", {"Faulted()"}},
+      {"0250000000001^error,msg=\"During startup program exited.\"\n",
+       {LogError("During startup program exited."), "Exited(-1,During startup program exited.)"}},
+  };
+  for (const TCase& Case : Cases)
+    EXPECT_EQ(Parse(Case.Block), Case.Calls) << Case.Block;
+}
+
+TEST(ParserResults, SecondResultForTheSameTokenFindsNobody) {
+  // GDB answered -exec-continue after a SIGSEGV with ^running and later ^error.
+  TRecordingProcess Process;
+  TExecRunResult Continue;
+  Process.Register("2002", Continue);
+  const TCalls Calls = Parse("2002^running\n*running,thread-id=\"all\"\n"
+                             "2002^error,msg=\"Couldn't get registers: No such process.\"\n",
+                             Process);
+  EXPECT_EQ(Calls, (TCalls{"Resumed", LogError("Couldn't get registers: No such process."),
+                           "Faulted(Couldn't get registers: No such process.)"}));
+  EXPECT_TRUE(Continue.FAvailable);
+  EXPECT_FALSE(Continue.FError);
+}
+
+TEST(ParserResults, UnknownClassIsLoggedAndFailsTheRequest) {
+  TRecordingProcess Process;
+  TStackInfoDepthResult Depth;
+  Process.Register("5", Depth);
+  EXPECT_EQ(Parse("5^strange,x=\"1\"\r\n", Process), TCalls{LogUnknown("^strange,x=\"1\"\r\n")});
+  EXPECT_TRUE(Depth.FAvailable);
+  EXPECT_TRUE(Depth.FError);
+}
+
+TEST(ParserResults, ConnectedAndExitComplete) {
+  TRecordingProcess Process;
+  TExecRunResult Run;
+  TExecAbortResult Abort;
+  Process.Register("1", Run);
+  Process.Register("2", Abort);
+  EXPECT_EQ(Parse("1^connected\n2^exit\n", Process), TCalls{});
+  EXPECT_TRUE(Run.FAvailable);
+  EXPECT_TRUE(Abort.FAvailable);
+}
+
+TEST(ParserResults, CLIReplyRoutedThroughTheLogStream) {
+  TRecordingProcess Process;
+  TCLInfoLineAddressResult InfoLine("Prog.c", 12);
+  Process.Register("info line prog.c:12\\n", InfoLine);
+  const TCalls Calls = Parse("&\"info line prog.c:12\\n\"\n"
+                             "~\"Line 12 of \\\"prog.c\\\" starts at address 0x1205 <main+28> and ends at 0x1217.\\n\"\n"
+                             "^done\n",
+                             Process);
+  EXPECT_EQ(Calls, TCalls{});
+  EXPECT_TRUE(InfoLine.FAvailable);
+  EXPECT_FALSE(InfoLine.FError);
+  EXPECT_EQ(InfoLine.FAddress, 0x1205u);
+}
+
+TEST(ParserResults, CLIKillCompletesAndKeepsTheNextLine) {
+  TRecordingProcess Process;
+  TCLKillResult Kill;
+  Kill.FError = true;
+  Process.Register("kill\\n", Kill);
+  const TCalls Calls = Parse("&\"kill\\n\"\n~\"[Inferior 1 (process 9773) killed]\\n\"\n", Process);
+  EXPECT_TRUE(Kill.FAvailable);
+  EXPECT_FALSE(Kill.FError);
+  EXPECT_EQ(Calls, TCalls{LogConsole("[Inferior 1 (process 9773) killed] ")});
+}
+
+TEST(ParserResults, CLIReplyWithoutConsoleAnswerLeavesTheNextRecord) {
+  TRecordingProcess Process;
+  TCLInfoLineAddressResult InfoLine("prog.c", 12);
+  Process.Register("info line prog.c:12\\n", InfoLine);
+  const TCalls Calls = Parse("&\"info line prog.c:12\\n\"\n=thread-exited,id=\"2\",group-id=\"i1\"\n", Process);
+  EXPECT_TRUE(InfoLine.FAvailable);
+  EXPECT_EQ(Calls, TCalls{"ThreadExited(2)"});
+}
+
+// --- Stop records ---------------------------------------------------------------
+
+TEST(ParserStops, BreakpointHitFromGdb) {
+  const std::string Stop =
+      R"(*stopped,reason="breakpoint-hit",disp="keep",bkptno="1",locno="2",frame={addr="0x0000555555555204",)"
+      R"(func="twice",args=[{name="v",value="5"}],file="prog.c",fullname="/tmp/gt/prog.c",line="7",)"
+      R"(arch="i386:x86-64"},thread-id="1",stopped-threads="all",core="0")"
+      "\n";
+  EXPECT_EQ(Parse(Stop), (TCalls{"Breakpoint(1,prog.c:7@0x555555555204,1)", "Suspended(prog.c:7@0x555555555204,1,2)"}));
+  TRecordingProcess Handled;
+  Handled.BreakpointHandled = true;
+  EXPECT_EQ(Parse(Stop, Handled), TCalls{"Breakpoint(1,prog.c:7@0x555555555204,1)"});
+}
+
+TEST(ParserStops, ReasonsAndTheirNotifications) {
+  struct TCase {
+    std::string Record;
+    TCalls Calls;
+  } Cases[] = {
+      // Two watchpoints firing together repeat "reason" and "value".
+      {R"(*stopped,reason="watchpoint-trigger",wpt={number="3",exp="g1"},value={old="0",new="1"},)"
+       R"(reason="watchpoint-trigger",wpt={number="4",exp="g1"},value={old="0",new="1"},frame={addr="0x00005555555551b4",)"
+       R"(func="worker",args=[{name="arg",value="0x0"}],file="prog.c",fullname="/tmp/gt/prog.c",line="9",)"
+       R"(arch="i386:x86-64"},thread-id="2",stopped-threads="all",core="0")",
+       {"Suspended(prog.c:9@0x5555555551b4,2,2)"}},
+      {R"(*stopped,reason="end-stepping-range",frame={addr="0x1",func="main",file="prog.c",line="13"},thread-id="1")",
+       {"Suspended(prog.c:13@0x1,1,3)"}},
+      {R"(*stopped,reason="function-finished",thread-id="1")", {"Suspended(:0@0x0,1,3)"}},
+      {R"(*stopped,reason="exited",exit-code="010")", {"Exited(8,)"}},
+      {R"(*stopped,reason="exited")", {"Exited(-1,)"}},
+      {R"(*stopped,reason="exited-normally")", {"Exited(0,)"}},
+      {R"(*stopped,reason="exited-signalled",signal-name="SIGSEGV",signal-meaning="Segmentation fault")",
+       {"Exited(0,SIGSEGV)"}},
+      {R"(*stopped,reason="watchpoint-scope",wpnum="3")", {"WatchpointOutOfScope"}},
+      {R"(*stopped,addr="0x10",file="a.c",line="4",thread-id="3")", {"Suspended(a.c:4@0x10,3,1)"}},
+      {R"(*stopped)", {"Suspended(:0@0x0,-1,1)"}},
+      {R"(*stopped,reason="signal-received",signal-name="SIGSEGV",signal-meaning="Segmentation fault",)"
+       R"(frame={addr="0x0000555555555281",func="main",args=[{name="argc",value="2"}],file="prog.c",)"
+       R"(fullname="/tmp/gt/prog.c",line="18",arch="i386:x86-64"},thread-id="1",stopped-threads="all",core="0")",
+       {"Signal(SIGSEGV,Segmentation fault,prog.c:18@0x555555555281,1)"}},
+      {R"(*stopped,reason="exception-raised",kind="1",object="0x20",name="EMine",handler="0x40",thread-id="4")",
+       {"Exception(EMine,4)"}},
+  };
+  for (const TCase& Case : Cases)
+    EXPECT_EQ(Parse(Case.Record + "\n"), Case.Calls) << Case.Record;
+}
+
+TEST(ParserStops, ExitedNormallyWhileDyingReportsNothing) {
+  TRecordingProcess Process;
+  Process.Dying = true;
+  EXPECT_EQ(Parse("*stopped,reason=\"exited-normally\"\n", Process), TCalls{});
+}
+
+TEST(ParserStops, SignalReceivedFromLLDBNamesTheNumber) {
+  struct TCase {
+    std::string Signal;
+    std::string Call;
+  } Cases[] = {
+      {"9", "Exited(0,SIGKILL)"},
+      {"11", "Signal(SIGSEGV,,:0@0x0,2)"},
+      {"40", "Signal(40,,:0@0x0,2)"},
+  };
+  for (const TCase& Case : Cases) {
+    TRecordingProcess Process;
+    Process.LLDB = true;
+    EXPECT_EQ(Parse("*stopped,reason=\"signal-received\",signal=\"" + Case.Signal + "\",thread-id=\"2\"\n", Process),
+              TCalls{Case.Call});
+  }
+}
+
+TEST(ParserStops, ExceptionReportedAsText) {
+  TRecordingProcess Process;
+  Parse(R"(*stopped,reason="exception-received",exception="Exception throw 'EMyError' object 0x1234 encountered at address 0x5678",thread-id="1")"
+        "\n",
+        Process);
+  EXPECT_EQ(Process.LastException.Name, "EMyError");
+  EXPECT_EQ(Process.LastException.EObject, 0x1234u);
+  EXPECT_EQ(Process.LastException.Desc, "");
+  EXPECT_EQ(Process.LastException.Kind, 16);
+  EXPECT_EQ(Process.LastException.Location.Address, 0x5678u);
+
+  Parse(R"(*stopped,reason="exception-received",exception="Exception catch at 0x1",thread-id="1")"
+        "\n",
+        Process);
+  EXPECT_EQ(Process.LastException.Kind, 1);
+}
+
+TEST(ParserStops, LocationFromOriginalLocation) {
+  struct TCase {
+    std::string Frame;
+    std::string Location;
+  } Cases[] = {
+      {R"(addr="0x1",file="??")", ":0@0x1"},
+      {R"(addr="0x1",from="/lib/libc.so.6")", "/lib/libc.so.6:0@0x1"},
+      {R"(addr="0x1",original-location="unit.pas:42")", "unit.pas:42@0x1"},
+      {R"(addr="0x1",line="-1",original-location="C:\\src\\unit.pas:42")", R"(C:\\src\\unit.pas:42@0x1)"},
+  };
+  for (const TCase& Case : Cases) {
+    TMIScanner Scanner(Case.Frame);
+    TGDBLocation Location;
+    ParseLocation(Scanner, Location);
+    EXPECT_EQ(TRecordingProcess::Describe(Location), Case.Location) << Case.Frame;
+  }
+}
+
+// --- Notify records --------------------------------------------------------------
+
+TEST(ParserNotify, ThreadAndGroupRecords) {
+  struct TCase {
+    std::string Record;
+    TCalls Calls;
+  } Cases[] = {
+      {R"(=thread-created,id="1",group-id="i1")", {"ThreadCreated(1,1)"}},
+      {R"(=thread-created,id="3",osid="4711")", {"ThreadCreated(3,4711)"}},
+      {R"(=thread-exited,id="2",group-id="i1")", {"ThreadExited(2)"}},
+      {R"(=thread-selected,id="2")", {"ThreadSelected(2)"}},
+      {R"(=thread-group-added,id="i1")", {}},
+      {R"(=thread-group-created,id="i1")", {}},
+      {R"(=thread-group-started,id="i1",pid="9773")", {"Pid(9773)"}},
+      {R"(=thread-group-exited,id="i1",exit-code="010")", {}},
+      {R"(=breakpoint-modified,bkpt={number="1",type="breakpoint",disp="keep",enabled="y",addr="<MULTIPLE>",times="0",original-location="twice"},{number="1.1",enabled="y",addr="0x00005555555551f3",func="twice",file="prog.c",line="7",thread-groups=["i1"]})",
+       {}},
+      {R"(=cmd-param-changed,param="print pretty",value="on")",
+       {LogUnknown(R"(=cmd-param-changed,param="print pretty",value="on")"
+                   "\n")}},
+      {"=dyld-load-address-was-not-resolved", {"Restart"}},
+      {"=thread-created", {}},
+  };
+  for (const TCase& Case : Cases)
+    EXPECT_EQ(Parse(Case.Record + "\n"), Case.Calls) << Case.Record;
+}
+
+TEST(ParserNotify, LibraryLoadedFromGdb13) {
+  TRecordingProcess Process;
+  Parse(R"(=library-loaded,id="/lib/x86_64-linux-gnu/libc.so.6",target-name="/lib/x86_64-linux-gnu/libc.so.6",)"
+        R"(host-name="/lib/x86_64-linux-gnu/libc.so.6",symbols-loaded="0",thread-group="i1",)"
+        R"(ranges=[{from="0x00007ffff7df8380",to="0x00007ffff7f4c22d"}])"
+        "\n",
+        Process);
+  EXPECT_EQ(Process.Calls, TCalls{"ModuleLoaded(libc.so.6)"});
+  EXPECT_EQ(Process.LastModule.Path, R"(\lib\x86_64-linux-gnu\libc.so.6)");
+  EXPECT_EQ(Process.LastModule.EntryPoint, 0x7ffff7df8380u);
+  EXPECT_EQ(Process.LastModule.BaseAddress, 0x7ffff7df8380u);
+  EXPECT_EQ(Process.LastModule.Id, 1);
+}
+
+TEST(ParserNotify, LLDBLibraryWithoutLoadAddressIsNotReported) {
+  TRecordingProcess Process;
+  Process.LLDB = true;
+  EXPECT_EQ(Parse(R"(=library-loaded,id="1",target-name="C:\\w\\a.dll",host-name="a",loaded_addr="0x0")"
+                  "\n",
+                  Process),
+            TCalls{});
+  EXPECT_EQ(Parse(R"(=breakpoint-modified,bkpt={number="2",addr="0x10",file="a.c",line="3"})"
+                  "\n",
+                  Process),
+            TCalls{"BreakpointModified(2,a.c:3@0x10)"});
+}
+
+// --- Streams and program output ----------------------------------------------------
+
+TEST(ParserStreams, ConsoleAndTargetText) {
+  struct TCase {
+    std::string Block;
+    TCalls Calls;
+  } Cases[] = {
+      {R"(~"7\tstatic inline int twice(int v) { return v * 2; }\n")",
+       {LogConsole("7   static inline int twice(int v) { return v * 2; } ")}},
+      {R"(~"Current language:  auto; currently c\n")",
+       {LogConsole("Current language:  auto; currently c "), "Language(c)"}},
+      {R"(~"C:\\new\n")", {LogConsole(R"(C:\\new )")}},
+      {R"(~"")", {}},
+      {R"(~"ODS: hello\n")", {LogConsole("ODS: hello ")}},
+      {R"(@"abc\r\n")", {LogConsole("abc")}},
+      {R"(@"\n")", {LogConsole(R"(\n)")}},
+  };
+  for (const TCase& Case : Cases)
+    EXPECT_EQ(Parse(Case.Block + "\n"), Case.Calls) << Case.Block;
+}
+
+TEST(ParserStreams, ConsoleRecordsByPlatform) {
+  TRecordingProcess Windows;
+  Windows.Windows = true;
+  EXPECT_EQ(Parse("~\"ODS: hello\\n\"\n", Windows), TCalls{"Log(3,hello\\n)"});
+  TRecordingProcess LLDB;
+  LLDB.LLDB = true;
+  EXPECT_EQ(Parse("~\"target.max-children-count (int) = 256\\n\"\n"
+                  "~\"NAME         PASS   STOP   NOTIFY\\n===========  =====  =====  ======\\nSIGHUP\"\n"
+                  "some program output\nProcess ready to launch\n",
+                  LLDB),
+            (TCalls{"MaxChildren(256)", "Started"}));
+}
+
+TEST(ParserStreams, ProgramOutputKeepsItsDigitsAndPromptsVanish) {
+  EXPECT_EQ(Parse("5 apples\n(gdb) \nx=8 \"quoted\"\n"),
+            (TCalls{LogUnknown("5 apples\n"), LogUnknown("x=8 \"quoted\"\n")}));
+  TRecordingProcess CRLF;
+  CRLF.EndOfLineMarker = "(gdb) \r\n";
+  EXPECT_EQ(Parse("(gdb) \n(gdb) \r\n", CRLF), TCalls{});
+}
+
+TEST(ParserStreams, RecordGluedToProgramOutputIsProcessed) {
+  struct TCase {
+    std::string Block;
+    TCalls Calls;
+  } Cases[] = {
+      {"partial output=thread-created,id=\"2\",group-id=\"i1\"\n",
+       {LogUnknown("partial output"), "ThreadCreated(2,2)"}},
+      {"no-newline-output=library-loaded,id=\"/lib/a.so\",target-name=\"/lib/a.so\",host-name=\"/lib/a.so\",addr-low=\"0x10\"\n",
+       {LogUnknown("no-newline-output"), "ModuleLoaded(a.so)"}},
+      {"tail*stopped,reason=\"exited-normally\"\n", {LogUnknown("tail"), "Exited(0,)"}},
+      {"a=b, x*y\n", {LogUnknown("a=b, x*y\n")}},
+      {"press ^error\n", {LogUnknown("press ^error\n")}},
+  };
+  for (const TCase& Case : Cases)
+    EXPECT_EQ(Parse(Case.Block), Case.Calls) << Case.Block;
+
+  TRecordingProcess Process;
+  TExecRunResult Continue;
+  Process.Register("1008", Continue);
+  EXPECT_EQ(Parse("partial output1008^running\n", Process), (TCalls{LogUnknown("partial output"), "Resumed"}));
+  EXPECT_TRUE(Continue.FAvailable);
+}
+
+TEST(ParserStreams, GluedRecordsAreLeftWholeWithHXConsole) {
+  TRecordingProcess Process;
+  Process.HXConsole = true;
+  EXPECT_EQ(Parse("partial output=thread-created,id=\"2\"\n", Process),
+            TCalls{LogUnknown("partial output=thread-created,id=\"2\"\n")});
+}
+
+TEST(ParserNotify, UnloadedModuleKeepsWhatTheBlockAlreadyRead) {
+  TRecordingProcess Process;
+  Parse("=library-loaded,id=\"/lib/a.so\",target-name=\"/lib/a.so\",host-name=\"/lib/a.so\",addr-low=\"0x10\"\n"
+        "=library-unloaded,id=\"/lib/b.so\",target-name=\"/lib/b.so\"\n",
+        Process);
+  EXPECT_EQ(Process.Calls, (TCalls{"ModuleLoaded(a.so)", "ModuleUnloaded(b.so)"}));
+  EXPECT_EQ(Process.LastModule.Id, 2);
+  EXPECT_EQ(Process.LastModule.Path, "\\lib\\a.so");
+  EXPECT_EQ(Process.LastModule.EntryPoint, 0x10u);
+}
+
+} // namespace
