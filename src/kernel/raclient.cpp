@@ -2,21 +2,27 @@
 
 #include "platform/hostfiles.h"
 #include "platform/hostprocess.h"
+#include "platform/hostthread.h"
 
 #include <chrono>
+#include <thread>
 
 namespace midebug {
 
 namespace {
 
 constexpr int RunPollMs = 20;
+/// How often the end of a program that closed its output is looked for while
+/// a time-out runs.
+constexpr int ExitPollMs = 1;
+
+using TRunClock = std::chrono::steady_clock;
 
 /// Reads the child's output until it closes it; false when TimeoutMs passed.
-bool CollectUntilEnd(THandle Output, Integer TimeoutMs, std::string& Collected) {
-  const auto Deadline = std::chrono::steady_clock::now() + std::chrono::milliseconds(TimeoutMs);
+bool CollectUntilEnd(THandle Output, Integer TimeoutMs, TRunClock::time_point Deadline, std::string& Collected) {
   char Buffer[4096];
   for (;;) {
-    if (TimeoutMs > 0 && std::chrono::steady_clock::now() >= Deadline)
+    if (TimeoutMs > 0 && TRunClock::now() >= Deadline)
       return false;
     switch (WaitForPipeData(Output, RunPollMs)) {
     case TPipeState::Empty:
@@ -32,6 +38,19 @@ bool CollectUntilEnd(THandle Output, Integer TimeoutMs, std::string& Collected) 
     }
     }
   }
+}
+
+/// A program may close its output and go on running; with a time-out, waits
+/// for its end only until Deadline. False when the time passed first.
+bool WaitForExit(Integer Pid, Integer TimeoutMs, TRunClock::time_point Deadline) {
+  if (TimeoutMs <= 0)
+    return true;
+  while (!ChildProcessEnded(Pid)) {
+    if (TRunClock::now() >= Deadline)
+      return false;
+    YieldAndSleep(ExitPollMs);
+  }
+  return true;
 }
 
 } // namespace
@@ -60,15 +79,28 @@ bool TLocalMethodsClient::DoRun(const std::string& Program, const std::string& A
   ProcessId = Child.Pid;
   InputPipe.CloseRead();
   OutputPipe.CloseWrite();
-  if (!Input.empty())
-    WriteHandle(InputPipe.WriteHandle(), Input.data(), Input.size());
-  InputPipe.CloseWrite();
+  // The input is written by a thread of its own: a program that answers as it
+  // reads would otherwise fill its output pipe while this thread still writes
+  // to it, and both would wait for ever. The writer ends at the latest when
+  // the program has ended and its input pipe has no reader left.
+  std::jthread InputWriter;
+  if (Input.empty())
+    InputPipe.CloseWrite();
+  else
+    InputWriter = std::jthread([&InputPipe, &Input] {
+      WriteHandle(InputPipe.WriteHandle(), Input.data(), Input.size());
+      InputPipe.CloseWrite();
+    });
 
+  const auto Deadline = TRunClock::now() + std::chrono::milliseconds(TimeoutMs);
   std::string Collected;
-  const bool Ended = CollectUntilEnd(OutputPipe.ReadHandle(), TimeoutMs, Collected);
+  const bool Ended = CollectUntilEnd(OutputPipe.ReadHandle(), TimeoutMs, Deadline, Collected) &&
+                     WaitForExit(Child.Pid, TimeoutMs, Deadline);
   if (!Ended)
     KillProcess(Child.Pid);
   ExitCode = ReapChildProcess(Child.Pid);
+  if (InputWriter.joinable())
+    InputWriter.join();
   if (!Ended) {
     FResultText = "'" + Program + "' did not end in time";
     return false;
