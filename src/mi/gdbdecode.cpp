@@ -1,21 +1,486 @@
 /// \file
 /// Decoding of result payloads into the result objects, and the location
-/// readers shared with the stop records. Each command's decoder is a case of
-/// DecodeResult; a command without one answers false, so a done record with
-/// results completes its request with FError set.
+/// readers shared with the stop records. DecodeResult picks the decoder by
+/// the result's command; a command without one answers false, so a done
+/// record with results completes its request with FError set. Disassembly,
+/// registers, memory and line information are decoded in gdbdecodedata.cpp.
 
+#include "mi/gdbdecodeinternal.h"
 #include "mi/gdboutput.h"
+
+#include <map>
 
 namespace midebug {
 
+namespace decode {
+
+bool FindResult(TMIScanner& Scanner, std::string_view Name, std::string_view& Value) {
+  const TMIScanner::TState Saved = Scanner.SaveState();
+  bool Found = false;
+  while (!Scanner.AtEnd()) {
+    const std::string_view Key = Scanner.ReadKey();
+    if (Scanner.AtEnd())
+      break;
+    Scanner.NextChar();
+    const std::string_view Candidate = Scanner.ReadValue();
+    if (Key == Name) {
+      Value = Candidate;
+      Found = true;
+      break;
+    }
+    if (Scanner.AtEnd() || Scanner.Char() != ',')
+      break;
+    Scanner.NextChar();
+  }
+  Scanner.RestoreState(Saved);
+  return Found;
+}
+
+std::string_view TakeNext(TMIScanner& Scanner, std::string_view Name) {
+  const TMIScanner::TState Saved = Scanner.SaveState();
+  while (!Scanner.AtEnd()) {
+    const std::string_view Key = Scanner.ReadKey();
+    if (Scanner.AtEnd())
+      break;
+    Scanner.NextChar();
+    const std::string_view Value = Scanner.ReadValue();
+    const bool Separated = !Scanner.AtEnd() && Scanner.Char() == ',';
+    if (Separated)
+      Scanner.NextChar();
+    if (Key == Name)
+      return Value;
+    if (!Separated)
+      break;
+  }
+  Scanner.RestoreState(Saved);
+  return {};
+}
+
+} // namespace decode
+
 namespace {
 
+using decode::FindResult;
+using decode::ForEachElement;
+using decode::TakeNext;
+
+/// A frame level beyond this is not stored: levels place frames in an array,
+/// and a level taken from the reply must not size that array at will.
+constexpr Integer MaxFrameLevel = 100000;
+/// The most threads a thread-id listing is read for; the count comes from
+/// the reply and sizes the arrays.
+constexpr Integer MaxThreadCount = 100000;
+/// GDB's answer for a variable object with very many children reads as this.
+constexpr Integer MaxNumChild = 5000;
+
+template <typename TResult>
+TResult* As(TGDBResult& Result) {
+  return dynamic_cast<TResult*>(&Result);
+}
+
+std::string Text(std::string_view Value) { return std::string(Value); }
+
+Integer ReadNumChild(TMIScanner& Scanner) {
+  const Integer Count = Scanner.FindInteger("numchild", 0);
+  return Count > MaxNumChild ? MaxNumChild : Count;
+}
+
+/// Stores Item at Level in Array, growing it as needed; slots never filled
+/// stay empty records.
+template <typename TItem>
+void PlaceByLevel(std::vector<TItem>& Array, Integer Level, TItem&& Item) {
+  const size_t Slot = static_cast<size_t>(Level);
+  if (Slot >= Array.size())
+    Array.resize(Slot + 1);
+  Array[Slot] = std::move(Item);
+}
+
+bool ValidLevel(Integer Level) { return Level >= 0 && Level <= MaxFrameLevel; }
+
+/// The address of every location tuple of a breakpoint that resolved to
+/// several places. GDB 13 in mi2 puts the tuples beside "bkpt"
+/// (bkpt={...},{number="1.1",...},{number="1.2",...}); in mi3 and later GDB
+/// they come as "locations" inside it. FLocation becomes the first's.
+void ReadBreakpointLocations(TMIScanner& Scanner, std::string_view Locations, TBreakInsertResult& Breakpoint) {
+  TAddressArray Addresses;
+  auto ReadLocation = [&] {
+    if (Addresses.empty())
+      ParseLocation(Scanner, Breakpoint.FLocation);
+    Addresses.push_back(Scanner.FindUInt64("addr", 0));
+  };
+  if (!Locations.empty()) {
+    ForEachElement(Scanner, Locations, [&](std::string_view Element) {
+      if (!Element.empty())
+        ReadLocation();
+    });
+  } else {
+    while (!Scanner.AtEnd() && Scanner.Char() == '{') {
+      const std::string_view Tuple = Scanner.ReadValue();
+      if (!Tuple.empty()) {
+        TMIScanner::TNestedScan InTuple(Scanner, Tuple);
+        ReadLocation();
+      }
+      if (Scanner.AtEnd() || Scanner.Char() != ',')
+        break;
+      Scanner.NextChar();
+    }
+  }
+  if (!Addresses.empty())
+    Breakpoint.FAddresses = std::move(Addresses);
+}
+
+bool DecodeBreakInsert(TGDBResult& Result, TMIScanner& Scanner) {
+  auto* Breakpoint = As<TBreakInsertResult>(Result);
+  if (!Breakpoint)
+    return false;
+  const std::string_view Bkpt = TakeNext(Scanner, "bkpt");
+  if (!Bkpt.empty()) {
+    std::string_view Locations;
+    {
+      TMIScanner::TNestedScan InBkpt(Scanner, Bkpt);
+      Breakpoint->FBreakpoint = Scanner.FindInteger("number", -1);
+      if (Breakpoint->FBreakpoint == -1)
+        return false;
+      ParseLocation(Scanner, Breakpoint->FLocation);
+      FindResult(Scanner, "locations", Locations);
+    }
+    // The cursor is now after "bkpt", on the location tuples GDB 13 puts
+    // beside it.
+    ReadBreakpointLocations(Scanner, Locations, *Breakpoint);
+    return true;
+  }
+  Breakpoint->FAddresses.clear();
+  const std::string_view Matches = Scanner.FindValue("matches");
+  if (Matches.empty())
+    return false;
+  TMIScanner::TNestedScan InMatches(Scanner, Matches);
+  for (std::string_view Match = TakeNext(Scanner, "b"); !Match.empty(); Match = TakeNext(Scanner, "b")) {
+    TMIScanner::TNestedScan InMatch(Scanner, Match);
+    Breakpoint->FAddresses.push_back(Scanner.FindUInt64("addr", 0));
+  }
+  return true;
+}
+
+bool DecodeBreakWatch(TGDBResult& Result, TMIScanner& Scanner) {
+  auto* Watch = As<TBreakWatchResult>(Result);
+  if (!Watch)
+    return false;
+  // GDB names read and access watchpoints "hw-rwpt" and "hw-awpt".
+  std::string_view Tuple = Scanner.FindValue("wpt");
+  if (Tuple.empty())
+    Tuple = Scanner.FindValue("hw-awpt");
+  if (Tuple.empty())
+    Tuple = Scanner.FindValue("hw-rwpt");
+  TMIScanner::TNestedScan InTuple(Scanner, Tuple);
+  Watch->FBreakpoint = Scanner.FindInteger("number", -1);
+  if (Watch->FBreakpoint == -1)
+    return false;
+  Watch->FLocation = DummyLocation;
+  return true;
+}
+
+bool DecodeThreadInfo(TGDBResult& Result, TMIScanner& Scanner) {
+  auto* Info = As<TThreadInfoResult>(Result);
+  std::string_view Threads;
+  if (!Info || !FindResult(Scanner, "threads", Threads))
+    return false;
+  ForEachElement(Scanner, Threads, [&](std::string_view Element) {
+    if (Element.empty())
+      return;
+    const Integer Id = Scanner.FindInteger("id", -1);
+    if (Id == -1)
+      return;
+    Info->FIds.push_back(Id);
+    if (!Info->FStateOnly)
+      Info->FNames.push_back(TThreadInfoResult::FixupName(Text(Scanner.FindValue("target-id"))));
+    TGDBLocation Location;
+    Integer IgnoredThreadId = -1;
+    ParseStopFrame(Scanner, Location, IgnoredThreadId);
+    Info->FLocations.push_back(std::move(Location));
+    Info->FStates.push_back(Text(Scanner.FindValue("state")));
+  });
+  return true;
+}
+
+bool DecodeThreadListIds(TGDBResult& Result, TMIScanner& Scanner) {
+  auto* List = As<TThreadListIdsResult>(Result);
+  if (!List)
+    return false;
+  Integer Count = Scanner.FindInteger("number-of-threads", 0);
+  if (Count > MaxThreadCount)
+    Count = MaxThreadCount;
+  const size_t Size = Count > 0 ? static_cast<size_t>(Count) : 0;
+  List->FIds.assign(Size, 0);
+  List->FNames.assign(Size, std::string());
+  List->FStates.assign(Size, std::string());
+  if (Size == 0)
+    return true;
+  {
+    TMIScanner::TNestedScan InIds(Scanner, Scanner.FindValue("thread-ids"));
+    for (Integer& Id : List->FIds)
+      Id = MIStrToIntDef(TakeNext(Scanner, "thread-id"), -1);
+  }
+  std::multimap<Integer, size_t> SlotsById;
+  for (size_t Slot = 0; Slot < Size; ++Slot)
+    SlotsById.emplace(List->FIds[Slot], Slot);
+  TMIScanner::TNestedScan InThreads(Scanner, Scanner.FindValue("threads"));
+  for (size_t Index = 0; Index < Size; ++Index) {
+    const std::string_view Thread = TakeNext(Scanner, "thread");
+    if (Thread.empty())
+      break;
+    TMIScanner::TNestedScan InThread(Scanner, Thread);
+    const Integer Id = Scanner.FindInteger("thread-id", -1);
+    const std::string State = Text(Scanner.FindValue("state"));
+    const std::string UniqueId = Text(Scanner.FindValue("unique-id"));
+    const auto [First, Last] = SlotsById.equal_range(Id);
+    for (auto Slot = First; Slot != Last; ++Slot) {
+      List->FStates[Slot->second] = State;
+      List->FNames[Slot->second] = UniqueId;
+    }
+  }
+  return true;
+}
+
+bool DecodeThreadSelect(TGDBResult& Result, TMIScanner& Scanner) {
+  auto* Select = As<TThreadSelectResult>(Result);
+  if (!Select || Scanner.FindInteger("new-thread-id", -1) != Select->FThreadId)
+    return false;
+  const std::string_view Frame = Scanner.FindValue("frame");
+  if (Frame.empty())
+    return false;
+  TMIScanner::TNestedScan InFrame(Scanner, Frame);
+  Select->FFrameIndex = Scanner.FindInteger("level", 0);
+  ParseLocation(Scanner, Select->FLocation);
+  return true;
+}
+
+bool DecodeStackInfoFrame(TGDBResult& Result, TMIScanner& Scanner) {
+  auto* Info = As<TStackInfoFrameResult>(Result);
+  if (!Info)
+    return false;
+  const std::string_view Frame = Scanner.FindValue("frame");
+  if (Frame.empty())
+    return false;
+  TMIScanner::TNestedScan InFrame(Scanner, Frame);
+  ParseLocation(Scanner, Info->FLocation);
+  return true;
+}
+
 bool DecodeStackInfoDepth(TGDBResult& Result, TMIScanner& Scanner) {
-  auto* Depth = dynamic_cast<TStackInfoDepthResult*>(&Result);
+  auto* Depth = As<TStackInfoDepthResult>(Result);
   if (!Depth)
     return false;
   Depth->FStackDepth = Scanner.FindInteger("depth", -1);
   return Depth->FStackDepth != -1;
+}
+
+bool DecodeStackListFrames(TGDBResult& Result, TMIScanner& Scanner) {
+  auto* Frames = As<TStackListFramesResult>(Result);
+  std::string_view Stack;
+  if (!Frames || !FindResult(Scanner, "stack", Stack))
+    return false;
+  TMIScanner::TNestedScan InStack(Scanner, Stack);
+  for (std::string_view Frame = TakeNext(Scanner, "frame"); !Frame.empty(); Frame = TakeNext(Scanner, "frame")) {
+    TMIScanner::TNestedScan InFrame(Scanner, Frame);
+    const Integer Level = Scanner.FindInteger("level", -1);
+    if (!ValidLevel(Level))
+      continue;
+    TGDBStackFrame StackFrame;
+    ParseLocation(Scanner, StackFrame.Location);
+    StackFrame.Header = Text(Scanner.FindValue("func"));
+    PlaceByLevel(Frames->FStackFrames, Level, std::move(StackFrame));
+  }
+  return true;
+}
+
+/// True when a list's inner text holds results ("name=...") rather than
+/// values (c-strings, tuples, lists).
+bool HoldsResults(std::string_view ListText) {
+  return !ListText.empty() && ListText.front() != '"' && ListText.front() != '{' && ListText.front() != '[';
+}
+
+bool DecodeStackListArguments(TGDBResult& Result, TMIScanner& Scanner) {
+  auto* Arguments = As<TStackListArgumentsResult>(Result);
+  std::string_view StackArgs;
+  if (!Arguments || !FindResult(Scanner, "stack-args", StackArgs))
+    return false;
+  TMIScanner::TNestedScan InStackArgs(Scanner, StackArgs);
+  for (std::string_view Frame = TakeNext(Scanner, "frame"); !Frame.empty(); Frame = TakeNext(Scanner, "frame")) {
+    TMIScanner::TNestedScan InFrame(Scanner, Frame);
+    const Integer Level = Scanner.FindInteger("level", -1);
+    if (!ValidLevel(Level))
+      continue;
+    TGDBStackArgument FrameArguments;
+    const std::string_view Args = Scanner.FindValue("args");
+    if (HoldsResults(Args)) {
+      // Without values GDB lists the names alone: args=[name="x",name="y"].
+      TMIScanner::TNestedScan InArgs(Scanner, Args);
+      for (std::string_view Name = TakeNext(Scanner, "name"); !Name.empty(); Name = TakeNext(Scanner, "name"))
+        FrameArguments.NameValues.push_back({Text(Name), std::string()});
+    } else {
+      ForEachElement(Scanner, Args, [&](std::string_view Element) {
+        if (Element.empty()) {
+          FrameArguments.NameValues.emplace_back();
+          return;
+        }
+        std::string Name = Text(Scanner.FindValue("name"));
+        FrameArguments.NameValues.push_back({std::move(Name), Text(Scanner.FindValue("value"))});
+      });
+    }
+    PlaceByLevel(Arguments->FStackArguments, Level, std::move(FrameArguments));
+  }
+  return true;
+}
+
+bool DecodeStackListLocals(TGDBResult& Result, TMIScanner& Scanner) {
+  auto* Locals = As<TStackListLocalsResult>(Result);
+  if (!Locals)
+    return false;
+  Locals->FStackLocals.clear();
+  const std::string_view List = Scanner.FindValue("locals");
+  if (HoldsResults(List)) {
+    TMIScanner::TNestedScan InList(Scanner, List);
+    for (std::string_view Name = TakeNext(Scanner, "name"); !Name.empty(); Name = TakeNext(Scanner, "name"))
+      Locals->FStackLocals.push_back(Text(Name));
+    return true;
+  }
+  // With values GDB lists a tuple per local: locals=[{name="i",...},...].
+  ForEachElement(Scanner, List, [&](std::string_view Element) {
+    if (!Element.empty())
+      Locals->FStackLocals.push_back(Text(Scanner.FindValue("name")));
+  });
+  return true;
+}
+
+bool DecodeSymbolListLines(TGDBResult& Result, TMIScanner& Scanner) {
+  auto* Lines = As<TSymbolListLinesResult>(Result);
+  std::string_view List;
+  if (!Lines || !FindResult(Scanner, "lines", List))
+    return false;
+  ForEachElement(Scanner, List, [&](std::string_view Element) {
+    if (Element.empty())
+      return;
+    const UInt64 Address = Lines->FIncludeAddress ? Scanner.FindUInt64("pc", 0) : 0;
+    const Integer Line = Scanner.FindInteger("line", -1);
+    if (Line == -1)
+      return;
+    Lines->FLines.push_back(Line);
+    if (Lines->FIncludeAddress)
+      Lines->FAddresses.push_back(Address);
+  });
+  return true;
+}
+
+bool DecodeVarCreate(TGDBResult& Result, TMIScanner& Scanner) {
+  auto* Create = As<TVarCreateResult>(Result);
+  if (!Create)
+    return false;
+  Create->FName = Text(Scanner.FindValue("name"));
+  Create->FNumChild = ReadNumChild(Scanner);
+  Create->FType = Text(Scanner.FindValue("type"));
+  Create->FValue = Text(Scanner.FindValue("value"));
+  if (!Create->FValue.empty())
+    Create->FValueDefined = true;
+  return true;
+}
+
+bool DecodeVarInfoNumChildren(TGDBResult& Result, TMIScanner& Scanner) {
+  auto* Info = As<TVarInfoNumChildrenResult>(Result);
+  if (!Info)
+    return false;
+  Info->FCount = ReadNumChild(Scanner);
+  return true;
+}
+
+bool DecodeVarListChildren(TGDBResult& Result, TMIScanner& Scanner) {
+  auto* List = As<TVarListChildrenResult>(Result);
+  if (!List)
+    return false;
+  const Integer Count = ReadNumChild(Scanner);
+  if (Count <= 0)
+    return true;
+  std::string_view Children;
+  const bool Present = FindResult(Scanner, "children", Children);
+  List->FChildren.assign(static_cast<size_t>(Count), TGDBVarChild());
+  TMIScanner::TNestedScan InChildren(Scanner, Children);
+  for (TGDBVarChild& Child : List->FChildren) {
+    TMIScanner::TNestedScan InChild(Scanner, TakeNext(Scanner, "child"));
+    Child.Name = Text(Scanner.FindValue("name"));
+    Child.Expr = Text(Scanner.FindValue("exp"));
+    Child.NumChild = ReadNumChild(Scanner);
+    Child.VarType = Text(Scanner.FindValue("type"));
+  }
+  return Present;
+}
+
+bool DecodeVarInfoPathExpression(TGDBResult& Result, TMIScanner& Scanner) {
+  auto* Path = As<TVarInfoPathExpressionResult>(Result);
+  if (!Path)
+    return false;
+  Path->FExpr = Text(Scanner.FindValue("path_expr"));
+  return true;
+}
+
+bool DecodeVarShowAttributes(TGDBResult& Result, TMIScanner& Scanner, bool IsLLDB) {
+  auto* Attributes = As<TVarShowAttributesResult>(Result);
+  if (!Attributes)
+    return false;
+  if (Scanner.FindValue(IsLLDB ? "status" : "attr") == "editable")
+    Attributes->FEditable = true;
+  return true;
+}
+
+/// The commands whose whole answer is one "value".
+template <typename TResult>
+bool DecodeValue(TGDBResult& Result, TMIScanner& Scanner) {
+  auto* Typed = As<TResult>(Result);
+  if (!Typed)
+    return false;
+  Typed->FValue = Text(Scanner.FindValue("value"));
+  return true;
+}
+
+bool DecodeVarUpdate(TGDBResult& Result, TMIScanner& Scanner) {
+  auto* Update = As<TVarUpdateResult>(Result);
+  if (!Update)
+    return false;
+  const std::string_view List = Scanner.FindValue("changelist");
+  if (List.empty())
+    return true;
+  TNameValueArray Changes;
+  bool OutOfScope = false;
+  ForEachElement(Scanner, List, [&](std::string_view Element) {
+    if (OutOfScope || Element.empty())
+      return;
+    std::string Name = Text(Scanner.FindValue("name"));
+    std::string Value = Text(Scanner.FindValue("value"));
+    if (Scanner.FindValue("in_scope") != "true") {
+      OutOfScope = true;
+      return;
+    }
+    Changes.push_back({std::move(Name), std::move(Value)});
+  });
+  if (OutOfScope)
+    Update->FOutOfScope = true;
+  Update->FChangeList = std::move(Changes);
+  return true;
+}
+
+bool DecodePidInfo(TGDBResult& Result, TMIScanner& Scanner) {
+  auto* Pid = As<TPidInfoResult>(Result);
+  if (!Pid)
+    return false;
+  Pid->FPid = Scanner.FindInteger("process-id", -1);
+  return Pid->FPid != -1;
+}
+
+bool DecodeTargetInfoAsync(TGDBResult& Result, TMIScanner& Scanner) {
+  auto* Async = As<TTargetInfoAsyncResult>(Result);
+  std::string_view CanAsync;
+  if (!Async || !FindResult(Scanner, "can_async", CanAsync))
+    return false;
+  Async->FAsyncTarget = CanAsync == "true";
+  return true;
 }
 
 std::string LowerCaseASCII(std::string_view Text) {
@@ -27,7 +492,7 @@ std::string LowerCaseASCII(std::string_view Text) {
 }
 
 bool DecodeCLInfoLineAddress(TGDBResult& Result, TMIScanner& Scanner) {
-  auto* InfoLine = dynamic_cast<TCLInfoLineAddressResult*>(&Result);
+  auto* InfoLine = As<TCLInfoLineAddressResult>(Result);
   if (!InfoLine)
     return false;
   const std::string Text = LowerCaseASCII(Scanner.ReadCString());
@@ -42,10 +507,69 @@ bool DecodeCLInfoLineAddress(TGDBResult& Result, TMIScanner& Scanner) {
 } // namespace
 
 bool DecodeResult(TGDBResult& Result, TMIScanner& Scanner, bool IsLLDB) {
-  (void)IsLLDB;
   switch (Result.FCommand) {
+  case ctBreakInsert:
+    return DecodeBreakInsert(Result, Scanner);
+  case ctBreakWatch:
+    return DecodeBreakWatch(Result, Scanner);
+  case ctThreadInfo:
+    return DecodeThreadInfo(Result, Scanner);
+  case ctThreadListIds:
+    return DecodeThreadListIds(Result, Scanner);
+  case ctThreadSelect:
+    return DecodeThreadSelect(Result, Scanner);
+  case ctStackInfoFrame:
+    return DecodeStackInfoFrame(Result, Scanner);
   case ctStackInfoDepth:
     return DecodeStackInfoDepth(Result, Scanner);
+  case ctStackListFrames:
+    return DecodeStackListFrames(Result, Scanner);
+  case ctStackListArguments:
+    return DecodeStackListArguments(Result, Scanner);
+  case ctStackListLocals:
+    return DecodeStackListLocals(Result, Scanner);
+  case ctSymbolListLines:
+    return DecodeSymbolListLines(Result, Scanner);
+  case ctVarCreate:
+    return DecodeVarCreate(Result, Scanner);
+  case ctVarInfoNumChildren:
+    return DecodeVarInfoNumChildren(Result, Scanner);
+  case ctVarListChildren:
+    return DecodeVarListChildren(Result, Scanner);
+  case ctVarInfoPathExpression:
+    return DecodeVarInfoPathExpression(Result, Scanner);
+  case ctVarShowAttributes:
+    return DecodeVarShowAttributes(Result, Scanner, IsLLDB);
+  case ctVarEvaluateExpression:
+    return DecodeValue<TVarEvaluateExpressionResult>(Result, Scanner);
+  case ctVarAssign:
+    return DecodeValue<TVarAssignResult>(Result, Scanner);
+  case ctDataEvaluateExpression:
+    return DecodeValue<TDataEvaluateExpressionResult>(Result, Scanner);
+  case ctGdbShow:
+    return DecodeValue<TGdbShowResult>(Result, Scanner);
+  case ctVarUpdate:
+    return DecodeVarUpdate(Result, Scanner);
+  case ctDataDisassemble:
+    return decode::DecodeDataDisassemble(Result, Scanner);
+  case ctDataListRegisterNames:
+    return decode::DecodeDataListRegisterNames(Result, Scanner);
+  case ctDataListRegisterValues:
+    return decode::DecodeDataListRegisterValues(Result, Scanner);
+  case ctDataListXMMRegisterValues:
+    return decode::DecodeDataListXMMRegisterValues(Result, Scanner);
+  case ctDataListFPURegisterValues:
+    return decode::DecodeDataListFPURegisterValues(Result, Scanner);
+  case ctDataReadMemory:
+    return decode::DecodeDataReadMemory(Result, Scanner);
+  case ctDataReadMemoryBytes:
+    return decode::DecodeDataReadMemoryBytes(Result, Scanner);
+  case ctDataInfoLine:
+    return decode::DecodeDataInfoLine(Result, Scanner);
+  case ctPidInfo:
+    return DecodePidInfo(Result, Scanner);
+  case ctTargetInfoAsync:
+    return DecodeTargetInfoAsync(Result, Scanner);
   case ctExecRun:
   case ctFileExecAndSymbols:
   case ctTargetAttach:

@@ -1,0 +1,831 @@
+/// \file
+/// Real GDB 13 transcripts (tests/data/transcripts, recorded by record.sh
+/// there) fed to the output parser block by block, as the kernel hands them
+/// over. TranscriptEvents pins down the stops, notifications and streams a
+/// user sees; TranscriptDecoders the result objects of the commands that were
+/// sent, decoded from GDB's real replies.
+
+#include "mi/gdboutput.h"
+#include "mi/gdbresult.h"
+#include "recordingprocess.h"
+#include "testsupport.h"
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <fstream>
+#include <memory>
+#include <sstream>
+#include <string>
+#include <string_view>
+#include <utility>
+#include <vector>
+
+namespace midebug::test {
+namespace {
+
+using ::testing::ElementsAre;
+using ::testing::EndsWith;
+using ::testing::StartsWith;
+
+/// The prompt line that ends each reply block of GDB's MI output.
+constexpr std::string_view GDBPrompt = "(gdb) \n";
+
+/// Splits GDB's output at its prompt lines: each block is everything up to,
+/// without, one "(gdb) " line; what follows the last prompt is a block too.
+std::vector<std::string> SplitReplyBlocks(const std::string& Output) {
+  std::vector<std::string> Blocks;
+  size_t BlockStart = 0;
+  size_t LineStart = 0;
+  while (LineStart < Output.size()) {
+    size_t LineEnd = Output.find('\n', LineStart);
+    LineEnd = LineEnd == std::string::npos ? Output.size() : LineEnd + 1;
+    if (std::string_view(Output).substr(LineStart, LineEnd - LineStart) == GDBPrompt) {
+      Blocks.push_back(Output.substr(BlockStart, LineStart - BlockStart));
+      BlockStart = LineEnd;
+    }
+    LineStart = LineEnd;
+  }
+  if (BlockStart < Output.size())
+    Blocks.push_back(Output.substr(BlockStart));
+  return Blocks;
+}
+
+std::string ReadTranscript(const std::string& Name) {
+  std::ifstream File(TestDataDir() + "/transcripts/" + Name + ".mi", std::ios::binary);
+  std::ostringstream Text;
+  Text << File.rdbuf();
+  return Text.str();
+}
+
+/// One stop as the process heard it.
+struct TStop {
+  TGDBLocation Location;
+  Integer ThreadId = -1;
+  TThreadStopReason Reason = tsrNotStopped;
+};
+
+/// The recording process, with the arguments of the notifications a user
+/// sees kept as values.
+class TTranscriptProcess : public TRecordingProcess {
+public:
+  std::vector<TStop> Suspensions;
+  std::vector<std::pair<Integer, TStop>> BreakpointHits;
+  std::vector<std::pair<TGDBException, Integer>> Signals;
+  std::vector<std::pair<Integer, std::string>> Exits;
+  std::vector<TGDBLogEvent> LogEvents;
+  std::vector<TGDBModule> LoadedModules;
+  std::vector<std::pair<Integer, Integer>> CreatedThreads;
+  std::vector<Integer> ExitedThreads;
+  std::vector<Integer> Pids;
+  Integer Resumptions = 0;
+
+  void NotifyLogEvent(const TGDBLogEvent& Event) override {
+    TRecordingProcess::NotifyLogEvent(Event);
+    LogEvents.push_back(Event);
+  }
+  void NotifyProcessExited(Integer Code, const std::string& Signal) override {
+    TRecordingProcess::NotifyProcessExited(Code, Signal);
+    Exits.emplace_back(Code, Signal);
+  }
+  void NotifyProcessResumed() override {
+    TRecordingProcess::NotifyProcessResumed();
+    ++Resumptions;
+  }
+  void NotifyProcessSuspended(const TGDBLocation& Location, Integer ThreadId, TThreadStopReason Reason) override {
+    TRecordingProcess::NotifyProcessSuspended(Location, ThreadId, Reason);
+    Suspensions.push_back({Location, ThreadId, Reason});
+  }
+  void NotifySignalReceived(const TGDBException& Signal, Integer ThreadId) override {
+    TRecordingProcess::NotifySignalReceived(Signal, ThreadId);
+    Signals.emplace_back(Signal, ThreadId);
+  }
+  void NotifyThreadCreated(Integer ThreadId, Integer OsId) override {
+    TRecordingProcess::NotifyThreadCreated(ThreadId, OsId);
+    CreatedThreads.emplace_back(ThreadId, OsId);
+  }
+  void NotifyThreadExited(Integer ThreadId) override {
+    TRecordingProcess::NotifyThreadExited(ThreadId);
+    ExitedThreads.push_back(ThreadId);
+  }
+  void NotifyProcessPidCreated(Integer Pid) override {
+    TRecordingProcess::NotifyProcessPidCreated(Pid);
+    Pids.push_back(Pid);
+  }
+  void NotifyModuleLoaded(const TGDBModule& Module) override {
+    TRecordingProcess::NotifyModuleLoaded(Module);
+    LoadedModules.push_back(Module);
+  }
+  bool NotifyBreakpointOccurred(Integer Breakpoint, const TGDBLocation& Location, Integer ThreadId) override {
+    const bool Handled = TRecordingProcess::NotifyBreakpointOccurred(Breakpoint, Location, ThreadId);
+    BreakpointHits.push_back({Breakpoint, {Location, ThreadId, tsrAtBreakpoint}});
+    return Handled;
+  }
+
+  /// The texts logged with the given kind, in order.
+  std::vector<std::string> Logged(TGDBEvent Kind) const {
+    std::vector<std::string> Texts;
+    for (const TGDBLogEvent& Event : LogEvents)
+      if (Event.Event == Kind)
+        Texts.push_back(Event.Data);
+    return Texts;
+  }
+  bool Called(std::string_view Prefix) const {
+    return std::any_of(Calls.begin(), Calls.end(), [&](const std::string& Call) { return Call.starts_with(Prefix); });
+  }
+};
+
+/// A transcript replayed through the parser, with result objects registered
+/// under the tokens of the commands record.sh sent.
+class TTranscriptReplay {
+public:
+  /// Registers a result object under a command token and keeps it alive.
+  template <class TResult, class... TArgs> TResult& Expect(const std::string& Token, TArgs&&... Args) {
+    auto Result = std::make_unique<TResult>(std::forward<TArgs>(Args)...);
+    TResult& Registered = *Result;
+    Process.Register(Token, Registered);
+    FResults.push_back(std::move(Result));
+    return Registered;
+  }
+
+  /// Feeds the transcript to the parser one reply block at a time.
+  void Replay(const std::string& Name) {
+    const std::string Output = ReadTranscript(Name);
+    ASSERT_FALSE(Output.empty()) << "transcript " << Name << " is missing";
+    for (const std::string& Block : SplitReplyBlocks(Output))
+      ProcessGDBOutput(Block, Process);
+  }
+
+  TTranscriptProcess Process;
+
+private:
+  std::vector<std::unique_ptr<TGDBResult>> FResults;
+};
+
+bool IsEntered(const TGDBResult& Result) { return Result.FAvailable && !Result.FError; }
+
+::testing::AssertionResult IsAt(const TGDBLocation& Location, std::string_view File, Integer Line) {
+  if (Location.Source.ends_with(File) && Location.Line == Line)
+    return ::testing::AssertionSuccess();
+  return ::testing::AssertionFailure() << "at " << Location.Source << ":" << Location.Line << ", expected " << File
+                                       << ":" << Line;
+}
+
+std::vector<Byte> BytesOf(const TXMMFPURegValue& Value) {
+  return std::vector<Byte>(std::begin(Value.ByteReg), std::end(Value.ByteReg));
+}
+
+// ---------------------------------------------------------------------------
+// Stops, notifications and streams
+
+TEST(TranscriptEvents, StopsOfBreakpointsStepsFinishAndWatchpointsInOrder) {
+  TTranscriptReplay Replay;
+  Replay.Replay("stops");
+  const auto& Stops = Replay.Process.Suspensions;
+
+  ASSERT_EQ(Stops.size(), 10u);
+  // Breakpoint at main, four steps (the last glued behind program output),
+  // the breakpoint in add, finish, one more step.
+  EXPECT_TRUE(IsAt(Stops[0].Location, "stops.c", 34));
+  EXPECT_EQ(Stops[0].Reason, tsrAtBreakpoint);
+  EXPECT_TRUE(IsAt(Stops[1].Location, "stops.c", 35));
+  EXPECT_TRUE(IsAt(Stops[2].Location, "stops.c", 38));
+  EXPECT_TRUE(IsAt(Stops[3].Location, "stops.c", 39));
+  EXPECT_TRUE(IsAt(Stops[4].Location, "stops.c", 40));
+  for (size_t Step = 1; Step <= 4; ++Step)
+    EXPECT_EQ(Stops[Step].Reason, tsrStepDone) << "step " << Step;
+  EXPECT_TRUE(IsAt(Stops[5].Location, "stops.c", 18));
+  EXPECT_EQ(Stops[5].Reason, tsrAtBreakpoint);
+  EXPECT_TRUE(IsAt(Stops[6].Location, "stops.c", 40)) << "function-finished returns to the call";
+  EXPECT_EQ(Stops[6].Reason, tsrStepDone);
+  EXPECT_TRUE(IsAt(Stops[7].Location, "stops.c", 41));
+  EXPECT_EQ(Stops[7].Reason, tsrStepDone);
+  // Two watchpoints firing together are one stop, in bump.
+  EXPECT_TRUE(IsAt(Stops[8].Location, "stops.c", 25));
+  EXPECT_EQ(Stops[8].Reason, tsrAtBreakpoint);
+  EXPECT_EQ(Stops[8].Location.Address, 0x0000555555555186u);
+  // The read watchpoint, in probe.
+  EXPECT_TRUE(IsAt(Stops[9].Location, "stops.c", 29));
+  EXPECT_EQ(Stops[9].Reason, tsrAtBreakpoint);
+  for (const TStop& Stop : Stops)
+    EXPECT_EQ(Stop.ThreadId, 1);
+
+  ASSERT_EQ(Replay.Process.BreakpointHits.size(), 2u);
+  EXPECT_EQ(Replay.Process.BreakpointHits[0].first, 1);
+  EXPECT_EQ(Replay.Process.BreakpointHits[1].first, 2);
+  EXPECT_EQ(Replay.Process.BreakpointHits[1].second.Location.Address, 0x0000555555555163u);
+}
+
+TEST(TranscriptEvents, ExitCodesReadAsGdbMeansThem) {
+  struct TCase {
+    const char* Transcript;
+    Integer Code;
+    const char* Signal;
+  };
+  // GDB prints exit codes in octal: "010" is 8, "03" is 3.
+  const TCase Cases[] = {
+      {"stops", 8, ""},     {"records", 3, ""},   {"threads", 0, ""},
+      {"templates", 0, ""}, {"registers", 0, ""}, {"signals", 0, "SIGSEGV"},
+  };
+  for (const TCase& Case : Cases) {
+    TTranscriptReplay Replay;
+    Replay.Replay(Case.Transcript);
+    ASSERT_EQ(Replay.Process.Exits.size(), 1u) << Case.Transcript;
+    EXPECT_EQ(Replay.Process.Exits[0].first, Case.Code) << Case.Transcript;
+    EXPECT_EQ(Replay.Process.Exits[0].second, Case.Signal) << Case.Transcript;
+  }
+}
+
+TEST(TranscriptEvents, SignalsReportNameMeaningLocationAndThread) {
+  TTranscriptReplay Replay;
+  Replay.Replay("signals");
+  const auto& Signals = Replay.Process.Signals;
+
+  ASSERT_EQ(Signals.size(), 2u);
+  EXPECT_EQ(Signals[0].first.Name, "SIGUSR1");
+  EXPECT_EQ(Signals[0].first.Desc, "User defined signal 1");
+  EXPECT_TRUE(IsAt(Signals[0].first.Location, "pthread_kill.c", 44));
+  EXPECT_EQ(Signals[0].second, 1);
+  EXPECT_EQ(Signals[1].first.Name, "SIGSEGV");
+  EXPECT_EQ(Signals[1].first.Desc, "Segmentation fault");
+  EXPECT_TRUE(IsAt(Signals[1].first.Location, "signals.c", 14));
+  EXPECT_EQ(Signals[1].first.Location.Address, 0x00005555555551bfu);
+  EXPECT_EQ(Signals[1].second, 1);
+  // A signal is not a suspension of its own, and the fatal one ends the run.
+  EXPECT_TRUE(Replay.Process.Suspensions.empty());
+  EXPECT_THAT(Replay.Process.Exits, ElementsAre(std::make_pair(0, std::string("SIGSEGV"))));
+}
+
+TEST(TranscriptEvents, ThreadsCreatedHitAndExited) {
+  TTranscriptReplay Replay;
+  Replay.Replay("threads");
+  const TTranscriptProcess& Process = Replay.Process;
+
+  // GDB 13 gives no "osid": the OS id defaults to the thread id.
+  EXPECT_THAT(Process.CreatedThreads, ElementsAre(std::make_pair(1, 1), std::make_pair(2, 2), std::make_pair(3, 3)));
+  // Which worker reaches the breakpoint first, and which ends first, is
+  // the scheduler's choice; the main thread ends last.
+  ASSERT_EQ(Process.ExitedThreads.size(), 3u);
+  EXPECT_THAT(std::vector<Integer>(Process.ExitedThreads.begin(), Process.ExitedThreads.begin() + 2),
+              ::testing::UnorderedElementsAre(2, 3));
+  EXPECT_EQ(Process.ExitedThreads[2], 1);
+  ASSERT_EQ(Process.BreakpointHits.size(), 2u);
+  EXPECT_EQ(Process.BreakpointHits[0].first, 1);
+  EXPECT_TRUE(IsAt(Process.BreakpointHits[0].second.Location, "threads.c", 14));
+  EXPECT_THAT(Process.BreakpointHits[0].second.ThreadId, ::testing::AnyOf(2, 3)) << "a worker thread hit it";
+  EXPECT_EQ(Process.BreakpointHits[1].first, 2);
+  EXPECT_TRUE(IsAt(Process.BreakpointHits[1].second.Location, "threads.c", 27));
+  EXPECT_EQ(Process.BreakpointHits[1].second.ThreadId, 1);
+  // The pid of "=thread-group-started"; the group id "i1" is no pid.
+  ASSERT_EQ(Process.Pids.size(), 1u);
+  EXPECT_GT(Process.Pids[0], 0);
+  EXPECT_FALSE(Process.Called("ThreadSelected")) << "-thread-select answers with a result, not a notification";
+}
+
+TEST(TranscriptEvents, LibrariesLoadedWithNamesAndAddresses) {
+  TTranscriptReplay Replay;
+  Replay.Replay("threads");
+  const auto& Modules = Replay.Process.LoadedModules;
+
+  ASSERT_EQ(Modules.size(), 2u);
+  EXPECT_EQ(Modules[0].Name, "ld-linux-x86-64.so.2");
+  EXPECT_EQ(Modules[1].Name, "libc.so.6");
+  for (const TGDBModule& Module : Modules) {
+    // GDB 13 gives address ranges instead of "addr-low".
+    EXPECT_NE(Module.EntryPoint, 0u) << Module.Name;
+    EXPECT_EQ(Module.BaseAddress, Module.EntryPoint) << Module.Name;
+    EXPECT_THAT(Module.Path, EndsWith(Module.Name));
+    EXPECT_TRUE(Module.SymPath.empty()) << "GDB read no symbols of " << Module.Name;
+  }
+  EXPECT_EQ(Modules[1].EntryPoint, 0x00007ffff7df8380u);
+  EXPECT_NE(Modules[0].Id, Modules[1].Id);
+}
+
+TEST(TranscriptEvents, StaticPascalProgramLoadsNoLibrary) {
+  TTranscriptReplay Replay;
+  Replay.Replay("records");
+
+  EXPECT_TRUE(Replay.Process.LoadedModules.empty());
+  ASSERT_EQ(Replay.Process.BreakpointHits.size(), 1u);
+  EXPECT_TRUE(IsAt(Replay.Process.BreakpointHits[0].second.Location, "records.pas", 15));
+  ASSERT_EQ(Replay.Process.Suspensions.size(), 2u);
+  EXPECT_TRUE(IsAt(Replay.Process.Suspensions[1].Location, "records.pas", 28));
+  EXPECT_EQ(Replay.Process.Suspensions[1].Reason, tsrStepDone);
+}
+
+TEST(TranscriptEvents, TemplateBreakpointStopsInBothInstances) {
+  TTranscriptReplay Replay;
+  Replay.Replay("templates");
+  const auto& Hits = Replay.Process.BreakpointHits;
+
+  ASSERT_EQ(Hits.size(), 3u);
+  EXPECT_EQ(Hits[0].first, 1);
+  EXPECT_EQ(Hits[0].second.Location.Address, 0x000055555555526eu);
+  EXPECT_EQ(Hits[1].first, 1) << "the second location of breakpoint 1";
+  EXPECT_EQ(Hits[1].second.Location.Address, 0x0000555555555284u);
+  EXPECT_TRUE(IsAt(Hits[1].second.Location, "templates.cpp", 7));
+  EXPECT_EQ(Hits[2].first, 2);
+  EXPECT_TRUE(IsAt(Hits[2].second.Location, "templates.cpp", 27));
+  // GDB's "=breakpoint-modified" (every hit, the multi-location shape too)
+  // is not a move of the breakpoint.
+  EXPECT_FALSE(Replay.Process.Called("BreakpointModified"));
+  // Step into the method, then finish back into main.
+  ASSERT_EQ(Replay.Process.Suspensions.size(), 5u);
+  EXPECT_TRUE(IsAt(Replay.Process.Suspensions[3].Location, "templates.cpp", 15));
+  EXPECT_TRUE(IsAt(Replay.Process.Suspensions[4].Location, "templates.cpp", 28));
+}
+
+TEST(TranscriptEvents, ProgramOutputInterleavedWithRecordsIsLogged) {
+  TTranscriptReplay Replay;
+  Replay.Replay("stops");
+  const std::vector<std::string> Output = Replay.Process.Logged(etUnknown);
+
+  // "partial " had no line end; the stop record glued behind it is still a
+  // stop (checked in the stop order above), and only the text is logged.
+  EXPECT_THAT(Output, ::testing::Contains("partial "));
+  // "total=7" is glued to a "=breakpoint-modified" record, which is not one
+  // of the records split off program output: the whole line is logged.
+  EXPECT_THAT(Output, ::testing::Contains(StartsWith("total=7=breakpoint-modified,")));
+  EXPECT_THAT(Output, ::testing::Contains(" done\n"));
+  EXPECT_FALSE(Replay.Process.Called("Faulted"));
+}
+
+TEST(TranscriptEvents, ProgramOutputStartingWithDigitsIsLoggedWhole) {
+  struct TCase {
+    const char* Transcript;
+    const char* Output;
+  };
+  const TCase Cases[] = {
+      {"templates", "42 2.50\n"},
+      {"registers", "5.000000\n"},
+      {"threads", "results 10 20\n"},
+      {"records", "shifting done 5 2\n"},
+  };
+  for (const TCase& Case : Cases) {
+    TTranscriptReplay Replay;
+    Replay.Replay(Case.Transcript);
+    EXPECT_THAT(Replay.Process.Logged(etUnknown), ::testing::Contains(Case.Output)) << Case.Transcript;
+  }
+}
+
+TEST(TranscriptEvents, ConsoleStreamReachesTheLogFlattened) {
+  TTranscriptReplay Replay;
+  Replay.Replay("stops");
+  const std::vector<std::string> Console = Replay.Process.Logged(etConsole);
+
+  EXPECT_THAT(Console, ::testing::Contains("GNU gdb (Debian 13.1-3) 13.1 "));
+  EXPECT_THAT(Console, ::testing::Contains(StartsWith("Breakpoint 2, add (left=3, right=4) at ")));
+  EXPECT_THAT(Console, ::testing::Contains("Hardware watchpoint 4: counter*2 "));
+  EXPECT_THAT(Console, ::testing::Contains(::testing::MatchesRegex(R"(\[Inferior 1 \(process [0-9]+\) exited with code 010\] )")));
+}
+
+TEST(TranscriptEvents, SignalTextGluedToProgramOutputNeitherLostNorFatal) {
+  TTranscriptReplay Replay;
+  Replay.Replay("signals");
+  const std::vector<std::string> Output = Replay.Process.Logged(etUnknown);
+
+  // "raising" had no line end; GDB's console record follows on the same line.
+  EXPECT_THAT(Output, ::testing::Contains(StartsWith("raising")));
+  EXPECT_THAT(Output, ::testing::Contains(" faulting\n"));
+  // The log stream's "No such file" for glibc's source is not an error.
+  EXPECT_FALSE(Replay.Process.Called("Faulted"));
+}
+
+TEST(TranscriptEvents, CommandsWithoutPayloadCompleteWithoutError) {
+  TTranscriptReplay Replay;
+  auto& Load = Replay.Expect<TFileExecAndSymbolsResult>("0730000000001");
+  auto& Run = Replay.Expect<TExecRunResult>("0250000000004");
+  auto& Delete = Replay.Expect<TGDBResult>("0030000000037", ctBreakDelete);
+  auto& Exit = Replay.Expect<TGDBResult>("0940000000039", ctGdbExit);
+  Replay.Replay("stops");
+
+  EXPECT_TRUE(IsEntered(Load));
+  EXPECT_TRUE(IsEntered(Run));
+  EXPECT_TRUE(IsEntered(Delete));
+  EXPECT_TRUE(IsEntered(Exit));
+  EXPECT_TRUE(Replay.Process.WaitObjects.empty()) << "every registered command was answered";
+  // The "^running" of -exec-run, five -exec-next, four -exec-continue and
+  // -exec-finish.
+  EXPECT_EQ(Replay.Process.Resumptions, 11);
+}
+
+TEST(TranscriptEvents, ConsoleCommandsThroughInterpreterExecComplete) {
+  TTranscriptReplay Signals;
+  auto& Handle = Signals.Expect<TGDBResult>("1030000000002", ctInterpreterExec);
+  Signals.Replay("signals");
+  TTranscriptReplay Registers;
+  auto& SetXMM2 = Registers.Expect<TGDBResult>("1030000000011", ctInterpreterExec);
+  auto& SetXMM3 = Registers.Expect<TGDBResult>("1030000000012", ctInterpreterExec);
+  Registers.Replay("registers");
+
+  EXPECT_TRUE(IsEntered(Handle));
+  EXPECT_TRUE(IsEntered(SetXMM2));
+  EXPECT_TRUE(IsEntered(SetXMM3));
+}
+
+// ---------------------------------------------------------------------------
+// Result decoders
+
+TEST(TranscriptDecoders, BreakInsertOnFunctionAndSourceLine) {
+  TTranscriptReplay Replay;
+  auto& OnMain = Replay.Expect<TBreakInsertResult>("0070000000002");
+  auto& OnLine = Replay.Expect<TBreakInsertResult>("0070000000003");
+  Replay.Replay("stops");
+
+  EXPECT_TRUE(IsEntered(OnMain));
+  EXPECT_EQ(OnMain.FBreakpoint, 1);
+  EXPECT_TRUE(IsAt(OnMain.FLocation, "stops.c", 34));
+  EXPECT_EQ(OnMain.FLocation.Address, 0x119fu);
+  EXPECT_TRUE(IsEntered(OnLine));
+  EXPECT_EQ(OnLine.FBreakpoint, 2);
+  EXPECT_TRUE(IsAt(OnLine.FLocation, "stops.c", 18));
+}
+
+TEST(TranscriptDecoders, BreakInsertResolvingToSeveralLocations) {
+  TTranscriptReplay Replay;
+  auto& Twice = Replay.Expect<TBreakInsertResult>("0070000000002");
+  Replay.Replay("templates");
+
+  // GDB 13 (mi2) puts the location tuples beside "bkpt", whose own address
+  // is "<MULTIPLE>".
+  EXPECT_TRUE(IsEntered(Twice));
+  EXPECT_EQ(Twice.FBreakpoint, 1);
+  EXPECT_TRUE(IsAt(Twice.FLocation, "templates.cpp", 7));
+}
+
+TEST(TranscriptDecoders, BreakWatchForWriteAndReadWatchpoints) {
+  TTranscriptReplay Replay;
+  auto& Counter = Replay.Expect<TBreakWatchResult>("0090000000031");
+  auto& Doubled = Replay.Expect<TBreakWatchResult>("0090000000032");
+  auto& Sensor = Replay.Expect<TBreakWatchResult>("0090000000033");
+  Replay.Replay("stops");
+
+  EXPECT_TRUE(IsEntered(Counter));
+  EXPECT_EQ(Counter.FBreakpoint, 3);
+  EXPECT_TRUE(IsEntered(Doubled));
+  EXPECT_EQ(Doubled.FBreakpoint, 4);
+  // GDB 13 answers a read watchpoint with "hw-rwpt" instead of "wpt".
+  EXPECT_TRUE(IsEntered(Sensor));
+  EXPECT_EQ(Sensor.FBreakpoint, 5);
+}
+
+TEST(TranscriptDecoders, ThreadInfoOfOneAndOfThreeThreads) {
+  TTranscriptReplay Single;
+  auto& One = Single.Expect<TThreadInfoResult>("0160000000010", false);
+  Single.Replay("stops");
+  TTranscriptReplay Workers;
+  auto& Three = Workers.Expect<TThreadInfoResult>("0160000000004", false);
+  auto& AfterJoin = Workers.Expect<TThreadInfoResult>("0160000000011", true);
+  Workers.Replay("threads");
+
+  EXPECT_TRUE(IsEntered(One));
+  EXPECT_THAT(One.FIds, ElementsAre(1));
+  ASSERT_EQ(One.FNames.size(), 1u);
+  EXPECT_THAT(One.FNames[0], StartsWith("0x7ffff7dcf740 (LWP ")) << "target-id without its first word";
+  ASSERT_EQ(One.FLocations.size(), 1u);
+  EXPECT_TRUE(IsAt(One.FLocations[0], "stops.c", 18));
+  EXPECT_THAT(One.FStates, ElementsAre("stopped"));
+
+  EXPECT_TRUE(IsEntered(Three));
+  EXPECT_THAT(Three.FIds, ElementsAre(1, 2, 3));
+  ASSERT_EQ(Three.FLocations.size(), 3u);
+  EXPECT_TRUE(IsAt(Three.FLocations[0], "futex-internal.c", 57)) << "main waits in pthread_join";
+  EXPECT_TRUE(IsAt(Three.FLocations[1], "threads.c", 14));
+  EXPECT_TRUE(IsAt(Three.FLocations[2], "threads.c", 14));
+  EXPECT_THAT(Three.FStates, ElementsAre("stopped", "stopped", "stopped"));
+
+  EXPECT_TRUE(IsEntered(AfterJoin));
+  EXPECT_THAT(AfterJoin.FIds, ElementsAre(1));
+  EXPECT_THAT(AfterJoin.FStates, ElementsAre("stopped"));
+}
+
+TEST(TranscriptDecoders, ThreadListIdsAndThreadSelect) {
+  TTranscriptReplay Replay;
+  auto& Ids = Replay.Expect<TThreadListIdsResult>("0170000000005");
+  auto& Select = Replay.Expect<TThreadSelectResult>("0180000000006", 1);
+  Replay.Replay("threads");
+
+  EXPECT_TRUE(IsEntered(Ids));
+  EXPECT_THAT(Ids.FIds, ElementsAre(1, 2, 3));
+  EXPECT_TRUE(IsEntered(Select));
+  EXPECT_EQ(Select.FFrameIndex, 0);
+  EXPECT_TRUE(IsAt(Select.FLocation, "futex-internal.c", 57));
+}
+
+TEST(TranscriptDecoders, StackFrameDepthAndFrameList) {
+  TTranscriptReplay Replay;
+  auto& Frame = Replay.Expect<TStackInfoFrameResult>("0290000000011");
+  auto& Depth = Replay.Expect<TStackInfoDepthResult>("0300000000012");
+  auto& Frames = Replay.Expect<TStackListFramesResult>("0320000000013");
+  Replay.Replay("stops");
+  TTranscriptReplay Threads;
+  auto& MainFrames = Threads.Expect<TStackListFramesResult>("0320000000007");
+  Threads.Replay("threads");
+
+  EXPECT_TRUE(IsEntered(Frame));
+  EXPECT_TRUE(IsAt(Frame.FLocation, "stops.c", 18));
+  EXPECT_TRUE(IsEntered(Depth));
+  EXPECT_EQ(Depth.FStackDepth, 2);
+  EXPECT_TRUE(IsEntered(Frames));
+  ASSERT_EQ(Frames.FStackFrames.size(), 2u);
+  EXPECT_EQ(Frames.FStackFrames[0].Header, "add");
+  EXPECT_TRUE(IsAt(Frames.FStackFrames[0].Location, "stops.c", 18));
+  EXPECT_EQ(Frames.FStackFrames[1].Header, "main");
+  EXPECT_TRUE(IsAt(Frames.FStackFrames[1].Location, "stops.c", 40));
+  EXPECT_EQ(Frames.FStackFrames[1].Location.Address, 0x000055555555520du);
+  EXPECT_TRUE(IsEntered(MainFrames));
+  ASSERT_EQ(MainFrames.FStackFrames.size(), 5u);
+  EXPECT_EQ(MainFrames.FStackFrames[3].Header, "__pthread_clockjoin_ex");
+  EXPECT_TRUE(IsAt(MainFrames.FStackFrames[4].Location, "threads.c", 26));
+}
+
+TEST(TranscriptDecoders, StackFramesThroughLibrariesAndOtherLanguages) {
+  struct TCase {
+    const char* Transcript;
+    const char* Token;
+    std::vector<std::string> Functions;
+    const char* OuterFile;
+    Integer OuterLine;
+  };
+  const TCase Cases[] = {
+      {"signals", "0320000000004", {"__pthread_kill_implementation", "__pthread_kill_internal", "__GI_raise", "main"},
+       "signals.c", 11},
+      {"templates", "0320000000005", {"twice<int>", "main"}, "templates.cpp", 25},
+      {"records", "0320000000004", {"SHIFT", "main"}, "records.pas", 27},
+  };
+  for (const TCase& Case : Cases) {
+    TTranscriptReplay Replay;
+    auto& Frames = Replay.Expect<TStackListFramesResult>(Case.Token);
+    Replay.Replay(Case.Transcript);
+    EXPECT_TRUE(IsEntered(Frames)) << Case.Transcript;
+    std::vector<std::string> Functions;
+    for (const TGDBStackFrame& Frame : Frames.FStackFrames)
+      Functions.push_back(Frame.Header);
+    EXPECT_EQ(Functions, Case.Functions) << Case.Transcript;
+    if (!Frames.FStackFrames.empty()) {
+      EXPECT_TRUE(IsAt(Frames.FStackFrames.back().Location, Case.OuterFile, Case.OuterLine)) << Case.Transcript;
+    }
+  }
+}
+
+TEST(TranscriptDecoders, StackArgumentsAndLocals) {
+  TTranscriptReplay Replay;
+  auto& Arguments = Replay.Expect<TStackListArgumentsResult>("0310000000014");
+  auto& Locals = Replay.Expect<TStackListLocalsResult>("0330000000015");
+  Replay.Replay("stops");
+  TTranscriptReplay Pascal;
+  auto& PascalArguments = Pascal.Expect<TStackListArgumentsResult>("0310000000005");
+  auto& NoLocals = Pascal.Expect<TStackListLocalsResult>("0330000000009");
+  Pascal.Replay("records");
+
+  EXPECT_TRUE(IsEntered(Arguments));
+  ASSERT_EQ(Arguments.FStackArguments.size(), 2u);
+  const TNameValueArray& AddArguments = Arguments.FStackArguments[0].NameValues;
+  ASSERT_EQ(AddArguments.size(), 2u);
+  EXPECT_EQ(AddArguments[0].Name, "left");
+  EXPECT_EQ(AddArguments[0].Value, "3");
+  EXPECT_EQ(AddArguments[1].Name, "right");
+  EXPECT_EQ(AddArguments[1].Value, "4");
+  EXPECT_TRUE(Arguments.FStackArguments[1].NameValues.empty());
+  EXPECT_TRUE(IsEntered(Locals));
+  EXPECT_THAT(Locals.FStackLocals, ElementsAre("sum"));
+
+  EXPECT_TRUE(IsEntered(PascalArguments));
+  ASSERT_FALSE(PascalArguments.FStackArguments.empty());
+  const TNameValueArray& ShiftArguments = PascalArguments.FStackArguments[0].NameValues;
+  ASSERT_EQ(ShiftArguments.size(), 2u);
+  EXPECT_EQ(ShiftArguments[0].Name, "POINT");
+  EXPECT_EQ(ShiftArguments[0].Value, "{X = 3, Y = 4}");
+  EXPECT_EQ(ShiftArguments[1].Value, "2");
+  EXPECT_TRUE(IsEntered(NoLocals));
+  EXPECT_TRUE(NoLocals.FStackLocals.empty());
+}
+
+TEST(TranscriptDecoders, VariableObjectsOfStructAndArray) {
+  TTranscriptReplay Replay;
+  auto& Origin = Replay.Expect<TVarCreateResult>("0350000000018");
+  auto& OriginChildren = Replay.Expect<TVarListChildrenResult>("0400000000019");
+  auto& Squares = Replay.Expect<TVarCreateResult>("0350000000020");
+  auto& SquareChildren = Replay.Expect<TVarListChildrenResult>("0400000000021");
+  auto& Count = Replay.Expect<TVarInfoNumChildrenResult>("0390000000022");
+  auto& Name = Replay.Expect<TVarEvaluateExpressionResult>("0450000000023");
+  auto& Update = Replay.Expect<TVarUpdateResult>("0470000000035");
+  Replay.Replay("stops");
+
+  EXPECT_TRUE(IsEntered(Origin));
+  EXPECT_EQ(Origin.FName, "origin_var");
+  EXPECT_EQ(Origin.FNumChild, 3);
+  EXPECT_EQ(Origin.FType, "struct point");
+  EXPECT_EQ(Origin.FValue, "{...}");
+  EXPECT_TRUE(Origin.FValueDefined);
+
+  EXPECT_TRUE(IsEntered(OriginChildren));
+  ASSERT_EQ(OriginChildren.FChildren.size(), 3u);
+  EXPECT_EQ(OriginChildren.FChildren[0].Name, "origin_var.x");
+  EXPECT_EQ(OriginChildren.FChildren[0].Expr, "x");
+  EXPECT_EQ(OriginChildren.FChildren[0].VarType, "int");
+  EXPECT_EQ(OriginChildren.FChildren[2].Expr, "name");
+  EXPECT_EQ(OriginChildren.FChildren[2].NumChild, 1);
+  EXPECT_EQ(OriginChildren.FChildren[2].VarType, "const char *");
+
+  EXPECT_TRUE(IsEntered(Squares));
+  EXPECT_EQ(Squares.FNumChild, 5);
+  EXPECT_EQ(Squares.FType, "int [5]");
+  EXPECT_TRUE(IsEntered(SquareChildren));
+  std::vector<std::string> Expressions;
+  for (const TGDBVarChild& Child : SquareChildren.FChildren)
+    Expressions.push_back(Child.Expr);
+  EXPECT_THAT(Expressions, ElementsAre("0", "1", "2", "3", "4"));
+  EXPECT_TRUE(IsEntered(Count));
+  EXPECT_EQ(Count.FCount, 5);
+  EXPECT_TRUE(IsEntered(Name));
+  EXPECT_EQ(Name.FValue, "0x555555556004 \"origin\"");
+
+  EXPECT_TRUE(IsEntered(Update));
+  ASSERT_EQ(Update.FChangeList.size(), 1u);
+  EXPECT_EQ(Update.FChangeList[0].Name, "counter_var");
+  EXPECT_EQ(Update.FChangeList[0].Value, "1");
+  EXPECT_FALSE(Update.FOutOfScope);
+}
+
+TEST(TranscriptDecoders, VariableObjectsOfClassAndPascalRecord) {
+  TTranscriptReplay Replay;
+  auto& Account = Replay.Expect<TVarCreateResult>("0350000000010");
+  auto& Sections = Replay.Expect<TVarListChildrenResult>("0400000000011");
+  auto& Private = Replay.Expect<TVarListChildrenResult>("0400000000013");
+  auto& Path = Replay.Expect<TVarInfoPathExpressionResult>("0430000000014");
+  Replay.Replay("templates");
+  TTranscriptReplay Pascal;
+  auto& Origin = Pascal.Expect<TVarCreateResult>("0350000000006");
+  auto& Fields = Pascal.Expect<TVarListChildrenResult>("0400000000007");
+  auto& Element = Pascal.Expect<TDataEvaluateExpressionResult>("0500000000008");
+  Pascal.Replay("records");
+
+  EXPECT_TRUE(IsEntered(Account));
+  EXPECT_EQ(Account.FType, "Account");
+  EXPECT_EQ(Account.FNumChild, 2);
+  EXPECT_TRUE(IsEntered(Sections));
+  ASSERT_EQ(Sections.FChildren.size(), 2u);
+  EXPECT_EQ(Sections.FChildren[0].Expr, "public");
+  EXPECT_EQ(Sections.FChildren[1].Expr, "private");
+  EXPECT_EQ(Sections.FChildren[1].NumChild, 2);
+  EXPECT_TRUE(Sections.FChildren[1].VarType.empty()) << "access sections have no type";
+  EXPECT_TRUE(IsEntered(Private));
+  ASSERT_EQ(Private.FChildren.size(), 2u);
+  EXPECT_EQ(Private.FChildren[0].Name, "account.private.balance");
+  EXPECT_EQ(Private.FChildren[1].VarType, "int [3]");
+  EXPECT_EQ(Private.FChildren[1].NumChild, 3);
+  EXPECT_TRUE(IsEntered(Path));
+  EXPECT_EQ(Path.FExpr, "((savings).balance)");
+
+  EXPECT_TRUE(IsEntered(Origin));
+  EXPECT_EQ(Origin.FType, "TPOINT");
+  EXPECT_TRUE(IsEntered(Fields));
+  ASSERT_EQ(Fields.FChildren.size(), 2u);
+  EXPECT_EQ(Fields.FChildren[1].Expr, "Y");
+  EXPECT_EQ(Fields.FChildren[1].VarType, "LONGINT");
+  EXPECT_TRUE(IsEntered(Element));
+  EXPECT_EQ(Element.FValue, "20");
+}
+
+TEST(TranscriptDecoders, MemoryReadInBothForms) {
+  TTranscriptReplay Replay;
+  auto& Bytes = Replay.Expect<TDataReadMemoryResult>("0600000000025", true);
+  auto& Words = Replay.Expect<TDataReadMemoryResult>("0590000000026", false);
+  auto& Total = Replay.Expect<TDataEvaluateExpressionResult>("0500000000024");
+  Replay.Replay("stops");
+
+  const std::vector<Byte> Pattern = {0xde, 0xad, 0xbe, 0xef, 0x01, 0x02, 0x03, 0x04};
+  EXPECT_TRUE(IsEntered(Bytes));
+  EXPECT_EQ(Bytes.FData, Pattern);
+  EXPECT_TRUE(IsEntered(Words));
+  EXPECT_EQ(Words.FData, Pattern);
+  EXPECT_TRUE(IsEntered(Total));
+  EXPECT_EQ(Total.FValue, "7");
+}
+
+TEST(TranscriptDecoders, DisassemblyPlainAndWithSource) {
+  TTranscriptReplay Replay;
+  auto& Plain = Replay.Expect<TDataDisassembleResult>("0490000000027", false);
+  auto& Mixed = Replay.Expect<TDataDisassembleResult>("0490000000028", true);
+  auto& Lines = Replay.Expect<TSymbolListLinesResult>("0680000000029", true);
+  Replay.Replay("stops");
+
+  EXPECT_TRUE(IsEntered(Plain));
+  ASSERT_EQ(Plain.FData.size(), 3u);
+  EXPECT_EQ(Plain.FData[0].Address, 0x0000555555555210u);
+  EXPECT_EQ(Plain.FData[0].AsmData, "mov    -0x4(%rbp),%eax");
+  EXPECT_EQ(Plain.FData[2].Address, 0x0000555555555215u);
+  EXPECT_EQ(Plain.FData[0].Line, 0);
+
+  // Only the first instruction of a source line carries the line.
+  EXPECT_TRUE(IsEntered(Mixed));
+  ASSERT_EQ(Mixed.FData.size(), 7u);
+  EXPECT_TRUE(IsAt({Mixed.FData[0].Line, Mixed.FData[0].Source, 0}, "stops.c", 33));
+  EXPECT_EQ(Mixed.FData[0].AsmData, "push   %rbp");
+  EXPECT_EQ(Mixed.FData[1].Line, 0);
+  EXPECT_TRUE(Mixed.FData[1].Source.empty());
+  EXPECT_TRUE(IsAt({Mixed.FData[3].Line, Mixed.FData[3].Source, 0}, "stops.c", 34));
+  EXPECT_EQ(Mixed.FData[3].Address, 0x000055555555519fu);
+
+  EXPECT_TRUE(IsEntered(Lines));
+  ASSERT_EQ(Lines.FLines.size(), 27u);
+  ASSERT_EQ(Lines.FAddresses.size(), Lines.FLines.size());
+  EXPECT_EQ(Lines.FLines[0], 17);
+  EXPECT_EQ(Lines.FAddresses[0], 0x0000555555555159u);
+}
+
+TEST(TranscriptDecoders, RegisterNamesMapToGdbNumbers) {
+  TTranscriptReplay Replay;
+  auto& Names = Replay.Expect<TDataListRegisterNamesResult>("0520000000004", gcAMD64, "Linux64");
+  Replay.Replay("registers");
+
+  EXPECT_TRUE(IsEntered(Names));
+  ASSERT_GT(Names.FNames.size(), 57u);
+  EXPECT_EQ(Names.FNames[0], "rax");
+  EXPECT_EQ(Names.FNames[17], "eflags");
+  EXPECT_EQ(Names.FNames[24], "st0");
+  EXPECT_EQ(Names.FNames[40], "xmm0");
+  const TIntegerArray Ids = Names.GetRegisterIds();
+  ASSERT_EQ(Ids.size(), 24u);
+  EXPECT_EQ(Ids[1], 1) << "rbx";
+  EXPECT_EQ(Ids[6], 8) << "r8";
+  EXPECT_EQ(Ids[14], 6) << "rbp";
+  EXPECT_EQ(Ids[16], 16) << "rip";
+  const TIntegerArray FPUIds = Names.GetFPURegisterIds();
+  ASSERT_EQ(FPUIds.size(), 16u);
+  EXPECT_EQ(FPUIds[0], 24);
+  EXPECT_EQ(FPUIds[15], 39) << "fop";
+  const TIntegerArray XMMIds = Names.GetXMMRegisterIds();
+  ASSERT_EQ(XMMIds.size(), 17u);
+  EXPECT_EQ(XMMIds[1], 41);
+  EXPECT_EQ(XMMIds[16], 56) << "mxcsr";
+}
+
+TEST(TranscriptDecoders, GeneralRegisterValues) {
+  TIntegerArray General;
+  for (Integer Id = 0; Id <= 17; ++Id)
+    General.push_back(Id);
+  TTranscriptReplay Replay;
+  auto& All = Replay.Expect<TDataListRegisterValuesResult>("0530000000005", General);
+  auto& Flags = Replay.Expect<TDataListRegisterValuesResult>("0530000000006", 17, false);
+  Replay.Replay("registers");
+
+  EXPECT_TRUE(IsEntered(All));
+  ASSERT_EQ(All.FValues.size(), 18u);
+  EXPECT_EQ(All.FValues[0], 0x55667788u);
+  EXPECT_EQ(All.FValues[3], 0x11223344u);
+  EXPECT_EQ(All.FValues[16], 0x5555555551b8u) << "rip";
+  EXPECT_EQ(All.FValues[17], 0x206u);
+  EXPECT_TRUE(IsEntered(Flags));
+  EXPECT_EQ(Flags.FValue, 0x206u);
+}
+
+TEST(TranscriptDecoders, X87RegistersHoldTheir80BitValue) {
+  TTranscriptReplay Replay;
+  auto& Stack = Replay.Expect<TDataListFPURegisterValuesResult>("0570000000007", TIntegerArray{24, 25, 26, 27, 28, 29, 30, 31});
+  auto& Top = Replay.Expect<TDataListFPURegisterValuesResult>("0570000000008", 24);
+  Replay.Replay("registers");
+
+  // 5.0 as GDB prints st0 in hexadecimal: 0x4001a000000000000000.
+  const std::vector<Byte> Five = {0, 0, 0, 0, 0, 0, 0, 0xa0, 0x01, 0x40, 0, 0, 0, 0, 0, 0};
+  EXPECT_TRUE(IsEntered(Stack));
+  ASSERT_EQ(Stack.FValues.size(), 8u);
+  EXPECT_EQ(BytesOf(Stack.FValues[0]), Five);
+  EXPECT_EQ(BytesOf(Stack.FValues[1]), std::vector<Byte>(16, 0));
+  EXPECT_TRUE(IsEntered(Top));
+  EXPECT_EQ(BytesOf(Top.FValue), Five);
+}
+
+TEST(TranscriptDecoders, SSERegistersFromGdbVectorGroups) {
+  TTranscriptReplay Replay;
+  auto& Pair = Replay.Expect<TDataListXMMRegisterValuesResult>("0550000000009", TIntegerArray{40, 41});
+  auto& One = Replay.Expect<TDataListXMMRegisterValuesResult>("0550000000010", 41);
+  auto& Set = Replay.Expect<TDataListXMMRegisterValuesResult>("0550000000013", TIntegerArray{42, 43});
+  auto& Raw = Replay.Expect<TDataListXMMRegisterValuesResult>("0550000000014", 41);
+  Replay.Replay("registers");
+
+  const std::vector<Byte> Packed = {0x44, 0x33, 0x22, 0x11, 0x88, 0x77, 0x66, 0x55,
+                                    0x08, 0x19, 0x2a, 0x3b, 0x4c, 0x5d, 0x6e, 0x7f};
+  EXPECT_TRUE(IsEntered(Pair));
+  ASSERT_EQ(Pair.FValues.size(), 2u);
+  EXPECT_EQ(BytesOf(Pair.FValues[0]), Packed);
+  EXPECT_EQ(BytesOf(Pair.FValues[1]), Packed);
+  EXPECT_TRUE(IsEntered(One));
+  EXPECT_EQ(BytesOf(One.FValue), Packed);
+  EXPECT_TRUE(IsEntered(Raw));
+  EXPECT_EQ(BytesOf(Raw.FValue), Packed);
+
+  EXPECT_TRUE(IsEntered(Set));
+  ASSERT_EQ(Set.FValues.size(), 2u);
+  EXPECT_EQ(BytesOf(Set.FValues[0]), (std::vector<Byte>{0x04, 0x03, 0x02, 0x01, 0x08, 0x07, 0x06, 0x05, 0x0c, 0x0b,
+                                                        0x0a, 0x09, 0x10, 0x0f, 0x0e, 0x0d}));
+  // GDB compresses the twelve zero bytes as "0x0 <repeats 12 times>".
+  std::vector<Byte> Answer(16, 0);
+  Answer[12] = 0x2a;
+  EXPECT_EQ(BytesOf(Set.FValues[1]), Answer);
+}
+
+} // namespace
+} // namespace midebug::test
