@@ -7,6 +7,7 @@
 #include <benchmark/benchmark.h>
 
 #include <cstring>
+#include <map>
 #include <memory>
 #include <string>
 
@@ -17,9 +18,9 @@ constexpr const char* FramesToken = "0320000000001";
 constexpr const char* ArgumentsToken = "0310000000002";
 constexpr const char* ChildrenToken = "0400000000003";
 
-std::string StackFramesReply() {
+std::string StackFramesReply(int Count) {
   std::string Reply = std::string(FramesToken) + "^done,stack=[";
-  for (int Level = 0; Level < 512; ++Level) {
+  for (int Level = 0; Level < Count; ++Level) {
     if (Level > 0)
       Reply += ",";
     Reply += "frame={level=\"" + std::to_string(Level) + "\",addr=\"0x00005555555551" + std::to_string(40 + Level % 50) +
@@ -29,9 +30,9 @@ std::string StackFramesReply() {
   return Reply + "]\n";
 }
 
-std::string StackArgumentsReply() {
+std::string StackArgumentsReply(int Count) {
   std::string Reply = std::string(ArgumentsToken) + "^done,stack-args=[";
-  for (int Level = 0; Level < 512; ++Level) {
+  for (int Level = 0; Level < Count; ++Level) {
     if (Level > 0)
       Reply += ",";
     Reply += "frame={level=\"" + std::to_string(Level) + "\",args=[{name=\"depth\",value=\"" + std::to_string(Level) +
@@ -71,10 +72,10 @@ std::string OutputMixedWithRecords() {
 }
 
 /// Counts and ignores what the parser reports; hands out the waiting result
-/// of the block under test.
+/// of each request the block answers.
 class TSinkProcess : public IGDBInternalProcess {
 public:
-  std::unique_ptr<TGDBResult> WaitObject;
+  std::map<std::string, std::unique_ptr<TGDBResult>> WaitObjects;
   size_t Events = 0;
 
   int32_t QueryInterface(const TGUID&, void**) override { return IntfResultNoInterface; }
@@ -100,7 +101,10 @@ public:
   void NotifyBreakpointModified(Integer, const TGDBLocation&) override {}
   void NotifyWatchpointOutOfScope() override {}
   void NotifyProcessRestart() override {}
-  TGDBResult* RemoveWaitObject(const std::string&) override { return WaitObject.get(); }
+  TGDBResult* RemoveWaitObject(const std::string& Key) override {
+    const auto Found = WaitObjects.find(Key);
+    return Found == WaitObjects.end() ? nullptr : Found->second.get();
+  }
   std::string GetEndOfLineMarker() override { return "(gdb) \n"; }
   bool IsLLDB() override { return false; }
   bool IsAndroid64() override { return false; }
@@ -112,12 +116,15 @@ public:
   Integer GetModuleId(const std::string&) override { return 0; }
 };
 
-template <class TResult>
+/// Parses Block again and again, each time with fresh results waiting under
+/// the tokens it answers.
 void ParseBlock(benchmark::State& State, const std::string& Block) {
   TSinkProcess Process;
   for (auto _ : State) {
     State.PauseTiming();
-    Process.WaitObject = std::make_unique<TResult>();
+    Process.WaitObjects[FramesToken] = std::make_unique<TStackListFramesResult>();
+    Process.WaitObjects[ArgumentsToken] = std::make_unique<TStackListArgumentsResult>();
+    Process.WaitObjects[ChildrenToken] = std::make_unique<TVarListChildrenResult>();
     State.ResumeTiming();
     ProcessGDBOutput(Block, Process);
   }
@@ -137,7 +144,13 @@ void ScanLineEnds(benchmark::State& State, const std::string& Block) {
 }
 
 const std::string& Frames() {
-  static const std::string Block = StackFramesReply() + StackArgumentsReply();
+  static const std::string Block = StackFramesReply(512) + StackArgumentsReply(512);
+  return Block;
+}
+
+/// Eight times the frames: the time per byte must stay the same.
+const std::string& ManyFrames() {
+  static const std::string Block = StackFramesReply(4096) + StackArgumentsReply(4096);
   return Block;
 }
 const std::string& Children() {
@@ -149,15 +162,17 @@ const std::string& Output() {
   return Block;
 }
 
-void BM_ParseStackFrames(benchmark::State& State) { ParseBlock<TStackListFramesResult>(State, Frames()); }
+void BM_ParseStackFrames(benchmark::State& State) { ParseBlock(State, Frames()); }
 void BM_ScanStackFrames(benchmark::State& State) { ScanLineEnds(State, Frames()); }
-void BM_ParseChildren(benchmark::State& State) { ParseBlock<TVarListChildrenResult>(State, Children()); }
+void BM_ParseManyStackFrames(benchmark::State& State) { ParseBlock(State, ManyFrames()); }
+void BM_ParseChildren(benchmark::State& State) { ParseBlock(State, Children()); }
 void BM_ScanChildren(benchmark::State& State) { ScanLineEnds(State, Children()); }
-void BM_ParseProgramOutput(benchmark::State& State) { ParseBlock<TExecRunResult>(State, Output()); }
+void BM_ParseProgramOutput(benchmark::State& State) { ParseBlock(State, Output()); }
 void BM_ScanProgramOutput(benchmark::State& State) { ScanLineEnds(State, Output()); }
 
 BENCHMARK(BM_ParseStackFrames);
 BENCHMARK(BM_ScanStackFrames);
+BENCHMARK(BM_ParseManyStackFrames);
 BENCHMARK(BM_ParseChildren);
 BENCHMARK(BM_ScanChildren);
 BENCHMARK(BM_ParseProgramOutput)->Unit(benchmark::kMillisecond);
@@ -169,6 +184,7 @@ BENCHMARK(BM_ScanProgramOutput)->Unit(benchmark::kMillisecond);
 int main(int argc, char** argv) {
   return midebug::bench::RunAndPrintRatios(argc, argv,
                                            {{"BM_ParseStackFrames", "BM_ScanStackFrames"},
+                                            {"BM_ParseManyStackFrames", "BM_ParseStackFrames"},
                                             {"BM_ParseChildren", "BM_ScanChildren"},
                                             {"BM_ParseProgramOutput", "BM_ScanProgramOutput"}});
 }

@@ -273,18 +273,24 @@ std::string_view TMIScanner::ScanCString(bool Keep) {
   const size_t Start = FPos + 1;
   bool EscapedQuote = false;
   size_t I = Start;
-  while (I < FText.size() && FText[I] != '"') {
-    if (FText[I] == '\\') {
-      ++I;
-      if (I < FText.size() && FText[I] == '"')
-        EscapedQuote = true;
+  // Jump from quote to quote; a quote ends the string when an even number of
+  // backslashes precedes it (each backslash escapes the next character).
+  for (;;) {
+    const void* Quote = I < FText.size() ? std::memchr(FText.data() + I, '"', FText.size() - I) : nullptr;
+    if (!Quote) {
+      FPos = FText.size();
+      return {};
     }
-    if (I < FText.size())
-      ++I;
-  }
-  if (I >= FText.size()) {
-    FPos = FText.size();
-    return {};
+    const size_t QuotePos = static_cast<size_t>(static_cast<const char*>(Quote) - FText.data());
+    size_t Backslashes = 0;
+    while (QuotePos - Backslashes > Start && FText[QuotePos - Backslashes - 1] == '\\')
+      ++Backslashes;
+    if (Backslashes % 2 == 0) {
+      I = QuotePos;
+      break;
+    }
+    EscapedQuote = true;
+    I = QuotePos + 1;
   }
   FPos = I + 1;
   const std::string_view Raw = FText.substr(Start, I - Start);
