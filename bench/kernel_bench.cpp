@@ -112,21 +112,33 @@ void BM_InterleavedRoundTrips(benchmark::State& State) {
   TClock::duration KernelTime{};
   TClock::duration RawTime{};
   Cardinal Request = 0;
+  bool Failed = false;
+  auto KernelRoundTrip = [&](const std::string& Line) {
+    const TClock::time_point Start = TClock::now();
+    Kernel.SendRequest(Line);
+    Failed |= !Kernel.GetReply(Reply);
+    KernelTime += TClock::now() - Start;
+  };
+  auto RawRoundTrip = [&](const std::string& Line) {
+    const TClock::time_point Start = TClock::now();
+    Gdb.Write(Line + "\n");
+    Failed |= !Gdb.ReadBlock(Reply);
+    RawTime += TClock::now() - Start;
+  };
   for (auto _ : State) {
     const std::string Line = std::to_string(++Request) + CheapCommand;
-    const TClock::time_point KernelStart = TClock::now();
-    Kernel.SendRequest(Line);
-    const bool KernelRead = Kernel.GetReply(Reply);
-    const TClock::time_point RawStart = TClock::now();
-    Gdb.Write(Line + "\n");
-    const bool RawRead = Gdb.ReadBlock(Reply);
-    const TClock::time_point RawEnd = TClock::now();
-    if (!KernelRead || !RawRead) {
+    // Which goes first alternates, so that neither always follows the other.
+    if (Request % 2 == 0) {
+      KernelRoundTrip(Line);
+      RawRoundTrip(Line);
+    } else {
+      RawRoundTrip(Line);
+      KernelRoundTrip(Line);
+    }
+    if (Failed) {
       State.SkipWithError("gdb went away");
       return;
     }
-    KernelTime += RawStart - KernelStart;
-    RawTime += RawEnd - RawStart;
   }
   const double Iterations = static_cast<double>(State.iterations());
   State.counters["kernel_us"] = std::chrono::duration<double, std::micro>(KernelTime).count() / Iterations;

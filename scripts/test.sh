@@ -1,7 +1,7 @@
 #!/usr/bin/env bash
-# Builds midebug and runs the whole test suite twice, in a normal build and in
-# one with AddressSanitizer + UndefinedBehaviorSanitizer, then fuzzes the MI
-# output parser for a minute.
+# Builds midebug and runs the whole test suite three times, in a normal build,
+# one with AddressSanitizer + UndefinedBehaviorSanitizer and one with
+# ThreadSanitizer, then fuzzes the MI output parser for a minute.
 set -euo pipefail
 cd "$(dirname "$0")/.."
 scripts/install-deps.sh
@@ -20,6 +20,9 @@ run_suite build -DCMAKE_BUILD_TYPE=RelWithDebInfo
 echo "== AddressSanitizer + UndefinedBehaviorSanitizer build"
 ASAN_OPTIONS=detect_leaks=1:abort_on_error=1 UBSAN_OPTIONS=print_stacktrace=1:halt_on_error=1 \
   run_suite build-asan -DCMAKE_BUILD_TYPE=Debug -DMIDEBUG_SANITIZE=asan-ubsan -DMIDEBUG_BENCHMARKS=OFF
+echo "== ThreadSanitizer build"
+TSAN_OPTIONS=halt_on_error=1:second_deadlock_stack=1 \
+  run_suite build-tsan -DCMAKE_BUILD_TYPE=RelWithDebInfo -DMIDEBUG_SANITIZE=tsan -DMIDEBUG_BENCHMARKS=OFF
 echo "== fuzzing the MI output parser"
 scripts/fuzz.sh 60
 echo "All tests passed."

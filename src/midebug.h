@@ -2,9 +2,12 @@
 /// \file
 /// The public face of the midebug library: code outside it includes only this.
 
+#include "inspect/gdbthread.h"
 #include "kernel/gdbkernel.h"
 #include "kernel/gdblogevent.h"
+#include "kernel/gdbremotekernel.h"
 #include "kernel/lldbkernel.h"
+#include "kernel/localagent.h"
 #include "kernel/raclient.h"
 #include "mi/gdbcommand.h"
 #include "mi/gdboutput.h"
@@ -12,6 +15,12 @@
 #include "platform/hostfiles.h"
 #include "platform/hostprocess.h"
 #include "platform/hostthread.h"
+#include "platform/mainthread.h"
 #include "platform/textencoding.h"
 #include "platform/types.h"
 #include "process/gdbinterfaces.h"
+#include "process/gdbprocess.h"
+#include "process/gdbprocessmanager.h"
+#include "process/ideservices.h"
+#include "process/liveprocesses.h"
+#include "process/lldbprocess.h"

@@ -97,8 +97,9 @@ public:
   virtual bool GetReply(std::string& Reply);
   virtual std::string GetLastError(bool ReadError);
 
-  /// Reading ends as soon as the pipe is empty.
-  void Stop();
+  /// Reading ends as soon as the debugger's output is drained. Virtual so
+  /// that a kernel whose reads block elsewhere can release its reader.
+  virtual void Stop();
   /// The prompt line that ends a reply, as the process layer recognises it.
   std::string GetEndOfLineMarker();
 

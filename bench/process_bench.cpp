@@ -1,0 +1,89 @@
+// The synchronous request round trip through the whole stack (requesting
+// thread, engine, agent, GDB, output thread, parser, woken requester) beside
+// the kernel's own round trip with the same GDB command, interleaved.
+
+#include "benchsupport.h"
+#include "midebug.h"
+
+#include <benchmark/benchmark.h>
+
+#include <chrono>
+#include <string>
+
+namespace midebug {
+namespace {
+
+/// The IDE side: nothing to do but answer that the debugger is lost.
+class TQuietListener : public TInterfaced<IGDBProcessListener> {
+public:
+  void ProcessSuspended(Integer) override {}
+  void ProcessResumed(Integer) override {}
+  void ProcessExited(Integer, const std::string&) override {}
+  void ThreadCreated(Integer) override {}
+  void ThreadExited(Integer) override {}
+  void ModuleLoaded(const TGDBModule&) override {}
+  void ModuleUnLoaded(const TGDBModule&) override {}
+  void SignalReceived(bool&, Integer, const TGDBException&) override {}
+  void ExceptionRaised(bool&, Integer, const TGDBException&) override {}
+  void LogEvent(const TGDBLogEvent&) override {}
+  void InternalError(const std::string&) override {}
+  bool FatalError() override { return true; }
+  void ProcessRestart() override {}
+};
+
+void BM_SyncRequestVsKernel(benchmark::State& State) {
+  SetMainThread();
+  TIntfPtr<IGDBProcess> Process;
+  try {
+    Process = TGDBProcessManager::CreateProcess(new TQuietListener, "/bin/true", "", "", "local", "Linux64", glC,
+                                                gcAMD64, "gdb");
+  } catch (const ENonAIRException& Error) {
+    State.SkipWithError(Error.what());
+    return;
+  }
+  auto& Core = *static_cast<TGDBProcess*>(Process.get());
+  TGDBKernel Kernel("", "");
+  std::string Reply;
+  if (!Kernel.Start() || !Kernel.GetReply(Reply)) {
+    State.SkipWithError("cannot start gdb");
+    return;
+  }
+  using TClock = std::chrono::steady_clock;
+  TClock::duration ProcessTime{};
+  TClock::duration KernelTime{};
+  Cardinal KernelRequest = 0;
+  for (auto _ : State) {
+    const TClock::time_point ProcessStart = TClock::now();
+    std::string Token;
+    TGdbShowResult Show;
+    std::string Line;
+    {
+      std::lock_guard Guard(Core.CommandLock());
+      Line = Core.Command().CreateGDBShowCommand(Token, "height");
+    }
+    Core.ProcessSyncRequest(Token, Line, Show);
+    const TClock::time_point KernelStart = TClock::now();
+    Kernel.SendRequest(std::to_string(++KernelRequest) + "-gdb-show height");
+    const bool KernelRead = Kernel.GetReply(Reply);
+    const TClock::time_point KernelEnd = TClock::now();
+    if (Show.FError || !KernelRead) {
+      State.SkipWithError("the request failed");
+      break;
+    }
+    ProcessTime += KernelStart - ProcessStart;
+    KernelTime += KernelEnd - KernelStart;
+  }
+  const double Iterations = static_cast<double>(State.iterations());
+  State.counters["process_us"] = std::chrono::duration<double, std::micro>(ProcessTime).count() / Iterations;
+  State.counters["kernel_us"] = std::chrono::duration<double, std::micro>(KernelTime).count() / Iterations;
+  State.counters["process/kernel"] =
+      static_cast<double>(ProcessTime.count()) / static_cast<double>(std::max<TClock::rep>(KernelTime.count(), 1));
+  Core.NotifyProcessExited(0, "");
+  ProcessPending();
+}
+BENCHMARK(BM_SyncRequestVsKernel)->UseRealTime()->MinTime(1.0)->Repetitions(5)->ReportAggregatesOnly(true);
+
+} // namespace
+} // namespace midebug
+
+int main(int argc, char** argv) { return midebug::bench::RunAndPrintRatios(argc, argv, {}); }

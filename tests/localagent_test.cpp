@@ -1,0 +1,215 @@
+// The in-process agent: debuggers started on this machine through the
+// "local" profile, the real GDB and lldb-mi played by the scripted fake.
+
+#include "midebug.h"
+#include "testsupport.h"
+
+#include <gtest/gtest.h>
+
+#include <filesystem>
+#include <fstream>
+#include <sstream>
+#include <thread>
+
+namespace midebug {
+namespace {
+
+using test::FakeDebuggerPath;
+using test::TestDataDir;
+using test::TScopedEnv;
+using test::TScratchDir;
+
+/// Reads reply blocks until one contains Needle; gives up on a read error.
+std::string ReplyContaining(TGDBKernel& Kernel, const std::string& Needle) {
+  std::string Reply;
+  while (Kernel.GetReply(Reply))
+    if (Reply.find(Needle) != std::string::npos)
+      return Reply;
+  return "read failed: " + Kernel.GetLastError(true);
+}
+
+/// Sends Command and returns the reply block that holds its result record.
+std::string Ask(TGDBKernel& Kernel, const std::string& Token, const std::string& Command) {
+  if (!Kernel.SendRequest(Token + Command))
+    return "write failed: " + Kernel.GetLastError(false);
+  return ReplyContaining(Kernel, Token + "^");
+}
+
+/// A remote kernel on GDB through the local profile, past its greeting.
+std::unique_ptr<TGDBRemoteKernel> StartLocalGdb() {
+  auto Kernel = std::make_unique<TGDBRemoteKernel>(LocalProfileName, "gdb", 0);
+  if (!Kernel->Start()) {
+    ADD_FAILURE() << Kernel->GetLastError(false);
+    return Kernel;
+  }
+  std::string Greeting;
+  EXPECT_TRUE(Kernel->GetReply(Greeting)) << Kernel->GetLastError(true);
+  EXPECT_NE(Greeting.find("=thread-group-added"), std::string::npos) << Greeting;
+  return Kernel;
+}
+
+TEST(LocalAgentWithGdb, RemoteKernelRunsARoundTripThroughBothChannels) {
+  auto Kernel = StartLocalGdb();
+  const std::string Reply = Ask(*Kernel, "0980000000001", "-gdb-version");
+  EXPECT_NE(Reply.find("~\"GNU gdb"), std::string::npos) << Reply;
+  EXPECT_TRUE(Reply.ends_with("0980000000001^done\n")) << Reply;
+  EXPECT_EQ(Kernel->FEntryPoint, 0u);
+  EXPECT_EQ(Kernel->GetLLDBInitFile(), "");
+}
+
+TEST(LocalAgentWithGdb, ReportsTheCapabilitiesGdbHasOnLinux) {
+  auto Kernel = StartLocalGdb();
+  EXPECT_EQ(Kernel->GetCapabilities(), TLocalAgentClient::GDBCapabilities);
+  EXPECT_TRUE(Kernel->IsLinux());
+  EXPECT_FALSE(Kernel->IsLLDB());
+  EXPECT_FALSE(Kernel->IsWindows());
+  EXPECT_TRUE(Kernel->SupportThreadNotification());
+  EXPECT_TRUE(Kernel->SupportPidNotification());
+  EXPECT_FALSE(Kernel->SupportExecInterruptCommand());
+  EXPECT_FALSE(Kernel->SupportStopOnEntryPoint());
+  EXPECT_EQ(Kernel->GetEndOfLineMarker(), "(gdb) \n");
+
+  // Each command-backed bit agrees with what this GDB says of the command.
+  struct TCommandBit {
+    const char* Command;
+    Int64 Bit;
+  };
+  const TCommandBit CommandBits[] = {
+      {"exec-abort", capExecAbortCommand},       {"pid-info", capPidInfoCommand},
+      {"thread-info", capThreadInfoCommand},     {"enable-timings", capTimingsEnableCommand},
+  };
+  int Token = 100;
+  for (const TCommandBit& Entry : CommandBits) {
+    const std::string Reply =
+        Ask(*Kernel, std::to_string(++Token), std::string("-info-gdb-mi-command ") + Entry.Command);
+    const bool Exists = Reply.find("exists=\"true\"") != std::string::npos;
+    EXPECT_EQ(Exists, (Kernel->GetCapabilities() & Entry.Bit) != 0) << Entry.Command << ": " << Reply;
+  }
+  EXPECT_NE(Ask(*Kernel, "201", "-gdb-set new-console on").find("201^error"), std::string::npos);
+  EXPECT_FALSE(Kernel->SupportNewConsoleOption());
+  EXPECT_NE(Ask(*Kernel, "202", "-enable-timings no").find("202^done"), std::string::npos);
+  EXPECT_TRUE(Kernel->SupportDisableTimings());
+}
+
+TEST(LocalAgentWithGdb, InterruptsAndKillsTheDebuggee) {
+  auto Kernel = StartLocalGdb();
+  ASSERT_NE(Ask(*Kernel, "1", "-file-exec-and-symbols /bin/sleep").find("1^done"), std::string::npos);
+  ASSERT_NE(Ask(*Kernel, "2", "-exec-arguments 60").find("2^done"), std::string::npos);
+  ASSERT_TRUE(Kernel->SendRequest("3-exec-run"));
+  const std::string Started = ReplyContaining(*Kernel, "3^running");
+  const std::string PidField = "pid=\"";
+  const size_t PidAt = Started.find(PidField);
+  ASSERT_NE(PidAt, std::string::npos) << Started;
+  const Integer Pid = std::stoi(Started.substr(PidAt + PidField.size()));
+
+  // GDB reads nothing while the program runs; the signal is what stops it.
+  Kernel->Interrupt(Pid);
+  EXPECT_NE(ReplyContaining(*Kernel, "*stopped").find("signal-name=\"SIGINT\""), std::string::npos);
+
+  Kernel->Terminate(Pid);
+  ASSERT_TRUE(Kernel->SendRequest("4-exec-continue"));
+  EXPECT_NE(ReplyContaining(*Kernel, "*stopped").find("exited-signalled"), std::string::npos);
+}
+
+TEST(LocalAgentChannels, StopReleasesAReaderWaitingOnTheOtherChannel) {
+  TLocalAgentClient Reader;
+  TLocalAgentClient Writer;
+  Reader.Connect(nullptr);
+  Writer.Connect(nullptr);
+  Integer Id = 0;
+  Int64 EntryPoint = -1;
+  Int64 Capabilities = 0;
+  std::string InitFile;
+  ASSERT_TRUE(Writer.GDBStart("gdb", 0, ktGDB, Id, EntryPoint, Capabilities, InitFile)) << Writer.GetLastError();
+  EXPECT_EQ(EntryPoint, 0);
+  std::string Greeting;
+  ASSERT_TRUE(Reader.GDBGetReply(Id, Greeting)) << Reader.GetLastError();
+
+  // GDB prints nothing more until asked: the reader waits until the stop.
+  bool ReadResult = true;
+  std::thread Waiting([&] {
+    std::string Reply;
+    ReadResult = Reader.GDBGetReply(Id, Reply);
+  });
+  Writer.GDBStop(Id);
+  Waiting.join();
+  EXPECT_FALSE(ReadResult);
+  EXPECT_NE(Reader.GetLastError(), "");
+  EXPECT_FALSE(Writer.GDBSendRequest(Id, "1-gdb-version"));
+  EXPECT_EQ(Writer.GetLastError(), "no debugger instance " + std::to_string(Id));
+}
+
+TEST(LocalAgentChannels, LogGoesIntoTheDebuggersTrafficLog) {
+  TScratchDir LogDir;
+  TScopedEnv Debug("GDB_DEBUG", "1");
+  TScopedEnv OutDir("GDB_OUTDIR", LogDir.Path());
+  {
+    auto Kernel = StartLocalGdb();
+    Kernel->Log("a line the process wrote", true);
+  }
+  std::string Log;
+  for (const auto& Entry : std::filesystem::directory_iterator(LogDir.Path())) {
+    std::ifstream In(Entry.path());
+    std::stringstream Text;
+    Text << In.rdbuf();
+    Log += Text.str();
+  }
+  EXPECT_NE(Log.find("=thread-group-added"), std::string::npos) << Log;
+  EXPECT_NE(Log.find("a line the process wrote\n"), std::string::npos) << Log;
+}
+
+TEST(LocalAgentChannels, MissingDebuggerIsNamedByTheWriteChannel) {
+  TGDBRemoteKernel Kernel(LocalProfileName, "/no/such/dir/gdb", 0);
+  EXPECT_FALSE(Kernel.Start());
+  EXPECT_EQ(Kernel.GetLastError(false), "Could not find program, '/no/such/dir/gdb'");
+  std::string Reply;
+  EXPECT_FALSE(Kernel.GetReply(Reply));
+}
+
+TEST(LocalAgentWithLldbMi, StartsTheFrontEndFromPathAndReportsLldbCapabilities) {
+  TScratchDir Bin;
+  std::filesystem::copy_file(FakeDebuggerPath(), Bin.Path() + "/lldb-mi");
+  TScopedEnv Path("PATH", Bin.Path() + ":" + GetEnvironmentVariable("PATH"));
+  TScopedEnv Script("FAKEMI_SCRIPT", TestDataDir() + "/fakemi/localagent-lldb.script");
+
+  TGDBRemoteKernel Kernel(LocalProfileName, "lldb-mi", 0);
+  Kernel.FKernelType = 6;
+  ASSERT_TRUE(Kernel.Start()) << Kernel.GetLastError(false);
+  EXPECT_EQ(Kernel.GetCapabilities(), TLocalAgentClient::LLDBCapabilities());
+  EXPECT_TRUE(Kernel.IsLLDB());
+  EXPECT_TRUE(Kernel.IsLinux());
+  EXPECT_FALSE(Kernel.IsWindows());
+  EXPECT_FALSE(Kernel.IsAndroid64());
+  EXPECT_TRUE(Kernel.SupportPidNotification());
+  EXPECT_FALSE(Kernel.SupportPidInfoCommand());
+  EXPECT_EQ(Kernel.GetEndOfLineMarker(), "(gdb)\n");
+
+  // The greeting block is what the front end printed before its prompt:
+  // here, the arguments it was started with.
+  std::string Reply;
+  ASSERT_TRUE(Kernel.GetReply(Reply)) << Kernel.GetLastError(true);
+  EXPECT_EQ(Reply, "--interpreter\n");
+
+  EXPECT_NE(Ask(Kernel, "11", "-break-insert -f main").find("pending=[\"main\"]"), std::string::npos);
+
+  // The front end prints a prompt after each asynchronous record of a run.
+  // A prompt ends a block only when it ends what has been read so far, so
+  // the records come in one block or several; either way all of them, in
+  // order, and without the last prompt.
+  ASSERT_TRUE(Kernel.SendRequest("12-exec-run"));
+  std::string Records;
+  while (Records.find("*running") == std::string::npos && Kernel.GetReply(Reply))
+    Records += Reply;
+  for (size_t Prompt; (Prompt = Records.find("(gdb)\n")) != std::string::npos;)
+    Records.erase(Prompt, 6);
+  EXPECT_EQ(Records, "12^running\n=thread-group-started,id=\"i1\",pid=\"4242\"\n"
+                     "=thread-created,id=\"1\",group-id=\"i1\"\n*running,thread-id=\"all\"\n");
+
+  ASSERT_TRUE(Kernel.SendRequest("13-gdb-exit"));
+  EXPECT_EQ(ReplyContaining(Kernel, "13^exit"), "13^exit\n");
+  EXPECT_FALSE(Kernel.GetReply(Reply));
+  EXPECT_EQ(Kernel.GetLastError(true), "process exited");
+}
+
+} // namespace
+} // namespace midebug
