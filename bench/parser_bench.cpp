@@ -3,6 +3,7 @@
 
 #include "benchsupport.h"
 #include "midebug.h"
+#include "nullprocess.h"
 
 #include <benchmark/benchmark.h>
 
@@ -73,47 +74,18 @@ std::string OutputMixedWithRecords() {
 
 /// Counts and ignores what the parser reports; hands out the waiting result
 /// of each request the block answers.
-class TSinkProcess : public IGDBInternalProcess {
+class TSinkProcess : public test::TNullInternalProcess {
 public:
   std::map<std::string, std::unique_ptr<TGDBResult>> WaitObjects;
   size_t Events = 0;
 
-  int32_t QueryInterface(const TGUID&, void**) override { return IntfResultNoInterface; }
-  int32_t AddRef() override { return 1; }
-  int32_t Release() override { return 1; }
   void NotifyLogEvent(const TGDBLogEvent&) override { ++Events; }
-  void NotifyProcessStarted() override {}
-  void NotifyProcessExited(Integer, const std::string&) override {}
-  void NotifyProcessResumed() override {}
-  void NotifyProcessFaulted(const std::string&) override {}
-  void NotifyProcessSuspended(const TGDBLocation&, Integer, TThreadStopReason) override {}
-  void NotifySignalReceived(const TGDBException&, Integer) override {}
-  void NotifyExceptionRaised(const TGDBException&, Integer) override {}
   void NotifyThreadCreated(Integer, Integer) override { ++Events; }
   void NotifyThreadExited(Integer) override { ++Events; }
-  void NotifyThreadSelected(Integer) override {}
-  void NotifyProcessPidCreated(Integer) override {}
-  void NotifyLanguageChanged(const std::string&) override {}
-  void NotifySettingMaxChildrenCountChanged(Integer) override {}
-  void NotifyModuleLoaded(const TGDBModule&) override {}
-  void NotifyModuleUnLoaded(const TGDBModule&) override {}
-  bool NotifyBreakpointOccurred(Integer, const TGDBLocation&, Integer) override { return false; }
-  void NotifyBreakpointModified(Integer, const TGDBLocation&) override {}
-  void NotifyWatchpointOutOfScope() override {}
-  void NotifyProcessRestart() override {}
   TGDBResult* RemoveWaitObject(const std::string& Key) override {
     const auto Found = WaitObjects.find(Key);
     return Found == WaitObjects.end() ? nullptr : Found->second.get();
   }
-  std::string GetEndOfLineMarker() override { return "(gdb) \n"; }
-  bool IsLLDB() override { return false; }
-  bool IsAndroid64() override { return false; }
-  bool IsLinux() override { return true; }
-  bool IsWindows() override { return false; }
-  bool IsAttachMode() override { return false; }
-  bool SupportHXConsole() override { return false; }
-  bool IsDying() override { return false; }
-  Integer GetModuleId(const std::string&) override { return 0; }
 };
 
 /// Parses Block again and again, each time with fresh results waiting under

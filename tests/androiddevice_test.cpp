@@ -21,6 +21,8 @@
 namespace midebug {
 namespace {
 
+using test::SplitLines;
+using test::ReadWholeFile;
 using test::TScratchDir;
 
 constexpr const char* ServerArgs = "shell /data/local/tmp/lldb-server platform --server";
@@ -58,21 +60,6 @@ case "$1 $2" in
   exit 2 ;;
 esac
 )sh";
-
-std::string ReadWholeFile(const std::string& Path) {
-  std::ifstream In(Path, std::ios::binary);
-  std::stringstream Text;
-  Text << In.rdbuf();
-  return Text.str();
-}
-
-TStringArray SplitLines(const std::string& Text) {
-  TStringArray Lines;
-  std::istringstream In(Text);
-  for (std::string Line; std::getline(In, Line);)
-    Lines.push_back(Line);
-  return Lines;
-}
 
 /// A process-list line in the device's layout for a process Name with the
 /// given id column.

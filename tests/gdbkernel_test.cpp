@@ -13,25 +13,11 @@
 namespace midebug {
 namespace {
 
+using test::ReplyContaining;
+using test::ReadWholeFile;
 using test::FakeDebuggerPath;
 using test::TScopedEnv;
 using test::TScratchDir;
-
-std::string ReadWholeFile(const std::string& Path) {
-  std::ifstream In(Path, std::ios::binary);
-  std::stringstream Text;
-  Text << In.rdbuf();
-  return Text.str();
-}
-
-/// Reads reply blocks until one contains Needle; gives up on a read error.
-std::string ReplyContaining(TGDBKernel& Kernel, const std::string& Needle) {
-  std::string Reply;
-  while (Kernel.GetReply(Reply))
-    if (Reply.find(Needle) != std::string::npos)
-      return Reply;
-  return "read failed: " + Kernel.GetLastError(true);
-}
 
 /// A kernel running the fake debugger on a script given inline.
 class FakeDebuggerTest : public ::testing::Test {

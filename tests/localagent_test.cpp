@@ -14,19 +14,11 @@
 namespace midebug {
 namespace {
 
+using test::ReplyContaining;
 using test::FakeDebuggerPath;
 using test::TestDataDir;
 using test::TScopedEnv;
 using test::TScratchDir;
-
-/// Reads reply blocks until one contains Needle; gives up on a read error.
-std::string ReplyContaining(TGDBKernel& Kernel, const std::string& Needle) {
-  std::string Reply;
-  while (Kernel.GetReply(Reply))
-    if (Reply.find(Needle) != std::string::npos)
-      return Reply;
-  return "read failed: " + Kernel.GetLastError(true);
-}
 
 /// Sends Command and returns the reply block that holds its result record.
 std::string Ask(TGDBKernel& Kernel, const std::string& Token, const std::string& Command) {

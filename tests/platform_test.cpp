@@ -26,23 +26,10 @@
 namespace midebug {
 namespace {
 
+using test::SplitLines;
+using test::ReadWholeFile;
 using test::TScopedEnv;
 using test::TScratchDir;
-
-std::string ReadWholeFile(const std::string& Path) {
-  std::ifstream In(Path, std::ios::binary);
-  std::stringstream Text;
-  Text << In.rdbuf();
-  return Text.str();
-}
-
-TStringArray SplitLines(const std::string& Text) {
-  TStringArray Lines;
-  std::istringstream In(Text);
-  for (std::string Line; std::getline(In, Line);)
-    Lines.push_back(Line);
-  return Lines;
-}
 
 // --- Text encodings --------------------------------------------------------
 

@@ -3,6 +3,7 @@
 #include <cstdlib>
 #include <filesystem>
 #include <fstream>
+#include <sstream>
 #include <stdexcept>
 
 namespace midebug::test {
@@ -10,6 +11,29 @@ namespace midebug::test {
 std::string FakeDebuggerPath() { return MIDEBUG_FAKE_MI; }
 
 std::string TestDataDir() { return MIDEBUG_TEST_DATA; }
+
+std::string ReadWholeFile(const std::string& Path) {
+  std::ifstream In(Path, std::ios::binary);
+  std::stringstream Text;
+  Text << In.rdbuf();
+  return Text.str();
+}
+
+TStringArray SplitLines(const std::string& Text) {
+  TStringArray Lines;
+  std::istringstream In(Text);
+  for (std::string Line; std::getline(In, Line);)
+    Lines.push_back(Line);
+  return Lines;
+}
+
+std::string ReplyContaining(TGDBKernel& Kernel, const std::string& Needle) {
+  std::string Reply;
+  while (Kernel.GetReply(Reply))
+    if (Reply.find(Needle) != std::string::npos)
+      return Reply;
+  return "read failed: " + Kernel.GetLastError(true);
+}
 
 TScratchDir::TScratchDir() {
   std::string Template = (std::filesystem::temp_directory_path() / "midebug-test-XXXXXX").string();

@@ -3,9 +3,21 @@
 /// Helpers shared by the tests: locating the fake debugger and test data,
 /// scratch directories, and compiling small programs to debug.
 
+#include "midebug.h"
+
 #include <string>
 
 namespace midebug::test {
+
+/// The whole content of a file, byte for byte (empty when unreadable).
+std::string ReadWholeFile(const std::string& Path);
+
+/// Text split at its line ends, without them.
+TStringArray SplitLines(const std::string& Text);
+
+/// Reads reply blocks until one contains Needle; on a read error, the error
+/// text after "read failed: ".
+std::string ReplyContaining(TGDBKernel& Kernel, const std::string& Needle);
 
 /// Path of the scripted fake MI debugger built beside the tests.
 std::string FakeDebuggerPath();

@@ -17,24 +17,6 @@ TResult* As(TGDBResult& Result) {
   return dynamic_cast<TResult*>(&Result);
 }
 
-std::string_view TrimBlanks(std::string_view Text) {
-  while (!Text.empty() && (Text.front() == ' ' || Text.front() == '\t'))
-    Text.remove_prefix(1);
-  while (!Text.empty() && (Text.back() == ' ' || Text.back() == '\t'))
-    Text.remove_suffix(1);
-  return Text;
-}
-
-int HexDigitValue(char Digit) {
-  if (Digit >= '0' && Digit <= '9')
-    return Digit - '0';
-  if (Digit >= 'a' && Digit <= 'f')
-    return Digit - 'a' + 10;
-  if (Digit >= 'A' && Digit <= 'F')
-    return Digit - 'A' + 10;
-  return -1;
-}
-
 // --- Disassembly ------------------------------------------------------------
 
 /// The instruction's length: "size" where the debugger gives it, else the

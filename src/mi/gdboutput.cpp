@@ -28,14 +28,6 @@ constexpr std::string_view LLDBProcessRunning =
 constexpr std::string_view AttachFailed = "error: attach failed";
 constexpr std::string_view LLDBProcessReady = "Process ready to launch\n";
 
-std::string_view TrimBlanks(std::string_view Text) {
-  while (!Text.empty() && (Text.front() == ' ' || Text.front() == '\t'))
-    Text.remove_prefix(1);
-  while (!Text.empty() && (Text.back() == ' ' || Text.back() == '\t'))
-    Text.remove_suffix(1);
-  return Text;
-}
-
 std::string ReplaceAll(std::string Text, std::string_view From, std::string_view To) {
   size_t At = 0;
   while ((At = Text.find(From, At)) != std::string::npos) {

@@ -11,16 +11,6 @@ bool IsDigit(char C) { return C >= '0' && C <= '9'; }
 bool IsLetter(char C) { return (C >= 'a' && C <= 'z') || (C >= 'A' && C <= 'Z'); }
 bool IsBlank(char C) { return C == ' ' || C == '\t'; }
 
-int HexDigit(char C) {
-  if (IsDigit(C))
-    return C - '0';
-  if (C >= 'a' && C <= 'f')
-    return C - 'a' + 10;
-  if (C >= 'A' && C <= 'F')
-    return C - 'A' + 10;
-  return -1;
-}
-
 /// The sign and magnitude of a number text, or false when the text is not a
 /// number. Hexadecimal magnitudes may use all of MaxHexDigits digits; decimal
 /// ones must not exceed MaxDecimal.
@@ -52,7 +42,7 @@ bool ParseNumber(std::string_view Text, unsigned MaxHexDigits, uint64_t MaxDecim
     if (Text.size() - I > MaxHexDigits)
       return false;
     for (; I < Text.size(); ++I) {
-      const int Digit = HexDigit(Text[I]);
+      const int Digit = HexDigitValue(Text[I]);
       if (Digit < 0)
         return false;
       Magnitude = Magnitude * 16 + static_cast<uint64_t>(Digit);
@@ -99,6 +89,24 @@ bool IsGluedResultRecord(std::string_view Text, size_t Caret) {
 }
 
 } // namespace
+
+int HexDigitValue(char Digit) {
+  if (IsDigit(Digit))
+    return Digit - '0';
+  if (Digit >= 'a' && Digit <= 'f')
+    return Digit - 'a' + 10;
+  if (Digit >= 'A' && Digit <= 'F')
+    return Digit - 'A' + 10;
+  return -1;
+}
+
+std::string_view TrimBlanks(std::string_view Text) {
+  while (!Text.empty() && IsBlank(Text.front()))
+    Text.remove_prefix(1);
+  while (!Text.empty() && IsBlank(Text.back()))
+    Text.remove_suffix(1);
+  return Text;
+}
 
 Integer MIStrToIntDef(std::string_view Text, Integer Default) {
   bool Negative = false;

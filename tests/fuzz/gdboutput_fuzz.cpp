@@ -2,6 +2,7 @@
 // kind waiting under every token the block names.
 
 #include "midebug.h"
+#include "../nullprocess.h"
 
 #include <cstddef>
 #include <cstdint>
@@ -62,45 +63,20 @@ std::unique_ptr<TGDBResult> CreateResultFor(TMiCommand Command, uint8_t Flags) {
 
 /// Answers every question the parser asks, and hands out a fresh result
 /// object for every key it removes.
-class TFuzzProcess : public IGDBInternalProcess {
+class TFuzzProcess : public test::TNullInternalProcess {
 public:
   TFuzzProcess(TMiCommand Command, uint8_t Flags) : FCommand(Command), FFlags(Flags) {}
 
-  int32_t QueryInterface(const TGUID&, void**) override { return IntfResultNoInterface; }
-  int32_t AddRef() override { return 1; }
-  int32_t Release() override { return 1; }
-  void NotifyLogEvent(const TGDBLogEvent&) override {}
-  void NotifyProcessStarted() override {}
-  void NotifyProcessExited(Integer, const std::string&) override {}
-  void NotifyProcessResumed() override {}
-  void NotifyProcessFaulted(const std::string&) override {}
-  void NotifyProcessSuspended(const TGDBLocation&, Integer, TThreadStopReason) override {}
-  void NotifySignalReceived(const TGDBException&, Integer) override {}
-  void NotifyExceptionRaised(const TGDBException&, Integer) override {}
-  void NotifyThreadCreated(Integer, Integer) override {}
-  void NotifyThreadExited(Integer) override {}
-  void NotifyThreadSelected(Integer) override {}
-  void NotifyProcessPidCreated(Integer) override {}
-  void NotifyLanguageChanged(const std::string&) override {}
-  void NotifySettingMaxChildrenCountChanged(Integer) override {}
-  void NotifyModuleLoaded(const TGDBModule&) override {}
-  void NotifyModuleUnLoaded(const TGDBModule&) override {}
   bool NotifyBreakpointOccurred(Integer, const TGDBLocation&, Integer) override { return (FFlags & 4) != 0; }
-  void NotifyBreakpointModified(Integer, const TGDBLocation&) override {}
-  void NotifyWatchpointOutOfScope() override {}
-  void NotifyProcessRestart() override {}
   TGDBResult* RemoveWaitObject(const std::string&) override {
     FResults.push_back(CreateResultFor(FCommand, FFlags));
     return FResults.back().get();
   }
   std::string GetEndOfLineMarker() override { return (FFlags & 8) ? "(gdb)\n" : "(gdb) \n"; }
   bool IsLLDB() override { return (FFlags & 8) != 0; }
-  bool IsAndroid64() override { return false; }
-  bool IsLinux() override { return true; }
   bool IsWindows() override { return (FFlags & 16) != 0; }
   bool IsAttachMode() override { return (FFlags & 32) != 0; }
   bool SupportHXConsole() override { return (FFlags & 64) != 0; }
-  bool IsDying() override { return false; }
   Integer GetModuleId(const std::string& Name) override { return static_cast<Integer>(Name.size()); }
 
 private:
