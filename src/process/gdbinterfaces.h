@@ -204,10 +204,15 @@ protected:
     // acq_rel: every write made through other references happens before the
     // deletion on the thread that drops the last one.
     const int32_t Remaining = FRefCount.fetch_sub(1, std::memory_order_acq_rel) - 1;
-    if (Remaining == 0)
+    if (Remaining == 0) {
+      BeforeDestruction();
       delete this;
+    }
     return Remaining;
   }
+  /// Runs when the last reference has gone, just before deletion, while the
+  /// object is still whole: the place to stop threads that call into it.
+  virtual void BeforeDestruction() {}
 
 private:
   std::atomic<int32_t> FRefCount{0};

@@ -67,15 +67,19 @@ TGDBProcess::TGDBProcess(const TIntfPtr<IGDBProcessListener>& Listener, const st
   FLiveKey = AddLiveProcess(this);
 }
 
-TGDBProcess::~TGDBProcess() {
+void TGDBProcess::BeforeDestruction() {
   // A debugger still running (the IDE let go without Terminate or Detach, or
-  // start-up failed) is stopped first, so that the output thread leaves its
-  // read before the kernel goes.
+  // start-up failed) is stopped, and the output thread awaited, while the
+  // object is whole: that thread calls into it until it ends.
   FAlive = false;
   NotifyWaitObjects();
   if (FKernel)
     FKernel->Stop();
   TerminateAndFreeOutputThread();
+}
+
+TGDBProcess::~TGDBProcess() {
+  BeforeDestruction();
   {
     std::lock_guard Guard(FThreadLock);
     FSuspendedThread = nullptr;

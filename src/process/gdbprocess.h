@@ -185,6 +185,8 @@ public:
   Integer SyncRequestTimeout() const { return FSyncRequestTimeout; }
 
 protected:
+  /// Stops the debugger's reading and awaits the output thread.
+  void BeforeDestruction() override;
   /// Runs Delivery on the IDE's main thread: at once when called there,
   /// else queued. It runs only while this process still exists, holding the
   /// live-process lock.
