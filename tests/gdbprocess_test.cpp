@@ -218,6 +218,40 @@ wait-eof
   ProcessOf(Process).NotifyProcessExited(0, "");
 }
 
+TEST_F(ProcessTest, ExitOfAnUnknownThreadDoesNotHoldBackLaterExits) {
+  // LLDB follows threads from the start; its eleven start-up lines are skipped.
+  InstallFake("lldb-mi", R"(set-prompt (gdb)\n
+prompt
+expect *
+expect *
+expect *
+expect *
+expect *
+expect *
+expect *
+expect *
+expect *
+expect *
+expect *
+expect {TOKEN}-gdb-show target-async
+send {TOKEN}^done,value="off"
+prompt
+expect *
+expect-prefix {TOKEN}-file-exec-and-symbols
+send {TOKEN}^done
+prompt
+wait-eof
+)");
+  TIntfPtr<IGDBProcess> Process =
+      TGDBProcessManager::CreateProcess(Listener, "/work/prog", "", "", "local", "Linux64", glC, gcAMD64, "lldb-mi");
+  TGDBProcess& Core = ProcessOf(Process);
+  Core.NotifyThreadCreated(2, 2);
+  Core.NotifyThreadExited(7);
+  Core.NotifyThreadExited(2);
+  EXPECT_TRUE(Listener->PumpUntilCall("ThreadExited(2)", std::chrono::seconds(5)));
+  Core.NotifyProcessExited(0, "");
+}
+
 TEST_F(ProcessTest, LldbForAWindowsTargetDisablesStdio) {
   InstallFake("lldb-mi", R"(set-prompt (gdb)\n
 prompt

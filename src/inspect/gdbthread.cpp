@@ -32,18 +32,105 @@ void TGDBThread::ResetCallStack() {
   FCallCount = -1;
   FCallHeaders.clear();
   FFrameIndex = 0;
+  FReason = tsrUnknown;
+  FLocation = DummyLocation;
+}
+
+std::string TGDBThread::GetName() {
+  // The zombie is in no list: asking would only cost a request.
+  if (FName.empty() && !ZombieState())
+    FProcess->UpdateAllThreadState(false);
+  return FName;
+}
+
+TThreadState TGDBThread::GetState() {
+  if (FProcess->ThreadStatesStale() && !ZombieState())
+    FProcess->UpdateAllThreadState(!FName.empty());
+  return FState;
 }
 
 TThreadStopReason TGDBThread::GetStopReason() { return FProcess->Suspended() ? FReason : tsrNotStopped; }
 TGDBCPU TGDBThread::GetCPUType() { return FProcess->Command().FCPUType; }
 TGDBLanguage TGDBThread::GetEvaluator() { return FProcess->GetEvaluator(); }
 
-// Call stacks, registers, stepping and evaluation come with their own
-// operations; until then they report nothing.
-Integer TGDBThread::GetCallCount() { return 0; }
-std::string TGDBThread::GetCallHeader(Integer) { return {}; }
-TGDBLocation TGDBThread::GetCallLocation(Integer) { return DummyLocation; }
+void TGDBThread::SetAsSuspendedThread() {
+  const Integer Current = FProcess->GetSuspendedThreadId();
+  if (Current == -1 || Current == FId || ZombieState())
+    return;
+  FProcess->SetSuspendedThread(FId);
+  // Only once the debugger has really switched: resetting the frame of the
+  // thread that stayed current would move that thread's selection instead.
+  if (FProcess->GetSuspendedThreadId() != FId || FFrameIndex == 0)
+    return;
+  FProcess->SetSuspendedThreadFrame(0);
+  FFrameIndex = 0;
+}
+
+void TGDBThread::SelectFrame(Integer Frame) {
+  if (Frame < 1 || Frame == FFrameIndex + 1 || FProcess->GetSuspendedThreadId() != FId)
+    return;
+  // The debugger refuses a frame beyond the stack but the selection would
+  // still be recorded, leaving the thread at a frame it is not at.
+  if (Frame > GetCallCount())
+    return;
+  FProcess->SetSuspendedThreadFrame(Frame - 1);
+  FFrameIndex = Frame - 1;
+}
+
+bool TGDBThread::ActsOnThisThread() {
+  // The zombie stands for every unknown thread number and is never reset:
+  // a stack fetched for it would be another thread's, and kept for good.
+  if (ZombieState())
+    return false;
+  const Integer Current = FProcess->GetSuspendedThreadId();
+  return Current == -1 || Current == FId;
+}
+
+Integer TGDBThread::GetCallCount() {
+  if (FCallCount == -1) {
+    SetAsSuspendedThread();
+    if (!ActsOnThisThread())
+      return 0;
+    FCallCount = FProcess->GetCallCount();
+  }
+  return FCallCount;
+}
+
+void TGDBThread::RefreshCallStack() {
+  if (FCallHeaders.empty()) {
+    SetAsSuspendedThread();
+    if (ActsOnThisThread())
+      FProcess->GetCallHeaders(FCallHeaders);
+  }
+  FCallCount = static_cast<Integer>(FCallHeaders.size());
+}
+
+const TGDBStackFrame* TGDBThread::CallFrame(Integer Index) {
+  RefreshCallStack();
+  if (Index < 1 || Index > FCallCount)
+    return nullptr;
+  return &FCallHeaders[static_cast<size_t>(Index - 1)];
+}
+
+std::string TGDBThread::GetCallHeader(Integer Index) {
+  const TGDBStackFrame* Frame = CallFrame(Index);
+  return Frame ? Frame->Header : std::string();
+}
+
+TGDBLocation TGDBThread::GetCallLocation(Integer Index) {
+  const TGDBStackFrame* Frame = CallFrame(Index);
+  return Frame ? Frame->Location : DummyLocation;
+}
+
+TStringArray TGDBThread::GetCallParams(Integer Index) {
+  const TGDBStackFrame* Frame = CallFrame(Index);
+  return Frame ? Frame->Params : TStringArray();
+}
+
 Integer TGDBThread::GetFileIndex(const std::string& FileName) { return FProcess->GetFileIndex(FileName); }
+
+// Registers, evaluation, inspectors and disassembly come with operations of
+// their own; until then they report failure.
 bool TGDBThread::GetRegisters(TUInt64Array& Values, UInt64& PC) {
   Values.clear();
   PC = FLocation.Address;
@@ -61,14 +148,39 @@ bool TGDBThread::GetXMMRegisters(TXMMRegValueArray& Values) {
 }
 bool TGDBThread::SetXMMRegisters(const TXMMRegValueArray&, const TXMMRegValueArray&) { return false; }
 bool TGDBThread::SetRunToMainBreakpoint(bool& NoEntryStop) {
-  NoEntryStop = true;
-  return false;
+  if (!FProcess->Kernel().SupportStopOnEntryPoint()) {
+    NoEntryStop = true;
+    return FProcess->CanSetRunToMainBreakpoint();
+  }
+  NoEntryStop = false;
+  return FProcess->SetRunToMainBreakpoint();
 }
-void TGDBThread::StepInto() {}
-void TGDBThread::StepOver() {}
-void TGDBThread::StepOut() {}
-void TGDBThread::InstStepInto() {}
-void TGDBThread::InstStepOver() {}
+
+void TGDBThread::StepInto() {
+  SetAsSuspendedThread();
+  FProcess->StepInto();
+}
+
+void TGDBThread::StepOver() {
+  SetAsSuspendedThread();
+  FProcess->StepOver();
+}
+
+void TGDBThread::StepOut() {
+  SetAsSuspendedThread();
+  FProcess->StepOut();
+}
+
+void TGDBThread::InstStepInto() {
+  SetAsSuspendedThread();
+  FProcess->InstStepInto();
+}
+
+void TGDBThread::InstStepOver() {
+  SetAsSuspendedThread();
+  FProcess->InstStepOver();
+}
+
 TGDBRetCode TGDBThread::Evaluate(const std::string&, const std::string&, Integer, std::string& Value, bool& CanModify,
                                  std::string& TypeName) {
   Value.clear();

@@ -19,13 +19,33 @@ public:
   /// The state a debugger's state text names; letter case is ignored and
   /// unknown text gives tsNone.
   static TThreadState StrToState(const std::string& State);
+  /// Forgets the call stack, the selected frame and the last stop: the
+  /// program has moved on.
   void ResetCallStack();
   bool ZombieState() const { return FState == tsZombie; }
 
+  /// Makes this thread the debugger's current thread, at its innermost
+  /// frame, unless it already is. Does nothing while the process has no
+  /// current thread.
+  void SetAsSuspendedThread();
+  /// Selects Frame (1-based) of this thread in the debugger unless it is
+  /// selected already; call after SetAsSuspendedThread. Skipped unless this
+  /// thread is the process's current thread, and for frame numbers outside
+  /// the stack.
+  void SelectFrame(Integer Frame);
+  /// Fetches the call stack once per stop; a failed fetch is tried again on
+  /// the next call.
+  void RefreshCallStack();
+  /// Parameter names of frame Index (1-based); empty out of range.
+  TStringArray GetCallParams(Integer Index);
+
   Integer GetId() override { return FId; }
   Integer GetOsId() override { return FOsId; }
-  std::string GetName() override { return FName; }
-  TThreadState GetState() override { return FState; }
+  /// Asks the debugger for every thread's name and state first while this
+  /// thread's name is unknown.
+  std::string GetName() override;
+  /// Refreshes every thread's state first when the program ran since.
+  TThreadState GetState() override;
   TThreadStopReason GetStopReason() override;
   TGDBLocation GetCurrentLocation() override { return FLocation; }
   TGDBCPU GetCPUType() override;
@@ -63,9 +83,18 @@ public:
   TThreadState FState;
   bool FActive = true;
   TGDBProcess* FProcess;
+  /// 0-based: the frame selected in the debugger for this thread.
   Integer FFrameIndex = 0;
   TGDBLocation FLocation;
   TThreadStopReason FReason = tsrNotStopped;
+
+private:
+  /// True when the debugger's current thread is this one, or when the
+  /// process has none (a program whose threads are not listed yet); never
+  /// for the zombie.
+  bool ActsOnThisThread();
+  /// The frame at Index (1-based) after fetching the stack, or nullptr.
+  const TGDBStackFrame* CallFrame(Integer Index);
 };
 
 } // namespace midebug

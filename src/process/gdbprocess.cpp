@@ -519,13 +519,6 @@ void TGDBProcess::TerminateAndFreeOutputThread() {
 
 // --- Events ----------------------------------------------------------------
 
-void TGDBProcess::NotifyLogEvent(const TGDBLogEvent& Event) {
-  DeferIfLive([this, Event] {
-    if (FProcessListener)
-      FProcessListener->LogEvent(Event);
-  });
-}
-
 void TGDBProcess::NotifyProcessExited(Integer Code, const std::string& Signal) {
   if (!FAlive || FExiting.exchange(true))
     return;

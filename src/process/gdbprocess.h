@@ -174,6 +174,26 @@ public:
   UInt64 GetBaseAddress() override { return FBaseAddress; }
   TGDBModule GetModule(Integer Id) override;
 
+  // --- Threads and call stacks ----------------------------------------
+  /// Makes ThreadId the debugger's current thread. On success the thread
+  /// becomes the process's current thread and takes the reply's location and
+  /// frame; a number not in the thread table leaves no current thread. A
+  /// rejected selection changes nothing.
+  void SetSuspendedThread(Integer ThreadId);
+  /// Selects Frame (0-based) of the current thread in the debugger and
+  /// records it, with its location, on the current thread.
+  void SetSuspendedThreadFrame(Integer Frame);
+  /// Depth of the current thread's stack, at most MaxCallFrames; 0 on error.
+  Integer GetCallCount();
+  /// The current thread's frames (at most MaxCallFrames) with their header
+  /// lines and parameter names; empty on error.
+  void GetCallHeaders(TStackFrameArray& Frames);
+  /// The deepest stack fetched or counted.
+  static constexpr Integer MaxCallFrames = 512;
+  /// True while the threads' states may be stale (the program ran since
+  /// they were last asked for).
+  bool ThreadStatesStale() const { return FUpdateThreadState; }
+
   /// The builder of this process's command lines; use it under
   /// FCommandLock, which keeps its request counter consistent.
   TGDBCommand& Command() { return *FCommand; }
@@ -183,6 +203,57 @@ public:
   bool Alive() const { return FAlive; }
   bool Suspended() const { return FSuspended; }
   Integer SyncRequestTimeout() const { return FSyncRequestTimeout; }
+
+  // --- Run control -------------------------------------------------------
+  /// The step commands; each is sent without waiting, and the stop that ends
+  /// it arrives as a notification.
+  void StepInto();
+  void StepOver();
+  void StepOut();
+  void InstStepInto();
+  void InstStepOver();
+  /// True once the run-to-main breakpoint is placed.
+  bool CanSetRunToMainBreakpoint() const { return FBreakOnMain != nullptr; }
+  /// Stops a synchronous target so that it accepts commands. True when this
+  /// call paused it (the caller must then SyncTargetResume); Aborted when the
+  /// pause could not be made in time or another internal pause is running.
+  bool SyncTargetPause(bool& Aborted, bool FatalOnExpiry);
+  /// Resumes a synchronous target paused by SyncTargetPause, unreported.
+  void SyncTargetResume();
+  /// As SyncTargetResume, for an asynchronous target.
+  void ASyncTargetResume();
+  /// Refreshes the thread table from the debugger's list of thread ids;
+  /// reports the threads it gains and loses. Call on the main thread.
+  void UpdateThreadList();
+  /// Refreshes the state, location and (unless StateOnly) the name of every
+  /// known thread. Call on the main thread.
+  void UpdateAllThreadState(bool StateOnly);
+  void ResetAllThreadCallStack();
+  /// Adds ThreadId to the table, and reports it, when the debugger does not
+  /// announce threads by itself.
+  void EnsureThreadCreated(Integer ThreadId);
+  /// The stop's main-thread part: refreshes the threads, records the stop on
+  /// the thread and tells the IDE.
+  void DoNotifyProcessSuspended(const TGDBLocation& Location, Integer ThreadId, TThreadStopReason Reason);
+
+private:
+  /// Starts a resume whose resumed notification the IDE does not hear, and
+  /// waits for it.
+  void InternalResume();
+  /// Takes GDB's console answer to the language question; true when Text
+  /// was that answer (it is then not shown to the IDE).
+  bool TakeLanguageAnswer(const std::string& Text);
+
+  /// The run-to-main breakpoint's listener, once placed.
+  TIntfPtr<IGDBBreakpointListener> FBreakOnMain;
+  /// Held by the one thread asking the debugger for the current language,
+  /// for the whole question; taken before FLanguageAnswerLock.
+  std::mutex FLanguageQueryLock;
+  /// Guards FLanguageQueryPending and FLanguageAnswer, written by the output
+  /// thread. A leaf lock.
+  std::mutex FLanguageAnswerLock;
+  bool FLanguageQueryPending = false;
+  std::string FLanguageAnswer;
 
 protected:
   /// Stops the debugger's reading and awaits the output thread.
@@ -281,6 +352,8 @@ private:
   std::stack<TGDBModule> FModuleUnLoadedPending;
   std::stack<Integer> FThreadCreatedPending;
   std::stack<Integer> FThreadExitedPending;
+  /// A delivery of FThreadExitedPending is queued and has not emptied it.
+  bool FThreadExitedDeliveryQueued = false;
 };
 
 } // namespace midebug

@@ -1,0 +1,434 @@
+// The console debugger `midebug` as a tool sees it: run in batch mode with
+// JSON output on small programs compiled here, driving the real GDB through
+// the default "local" profile.
+
+#include "testsupport.h"
+
+#include <gtest/gtest.h>
+#include <nlohmann/json.hpp>
+
+#include <algorithm>
+#include <cstdlib>
+#include <filesystem>
+#include <fstream>
+#include <functional>
+#include <set>
+#include <sstream>
+#include <string>
+#include <signal.h>
+#include <sys/wait.h>
+#include <vector>
+
+namespace midebug {
+namespace {
+
+using nlohmann::json;
+using test::TScratchDir;
+
+/// The generous limit, in seconds, a resuming command waits for a stop;
+/// only reached when the program never stops.
+const char* const WaitLimit = "20";
+
+/// What one run of the console debugger printed and how it ended.
+struct TCliRun {
+  std::vector<json> Lines;
+  std::string Stdout;
+  std::string Stderr;
+  int ExitCode = -1;
+
+  /// The first object for which Match holds, or null.
+  const json* Find(const std::function<bool(const json&)>& Match) const {
+    for (const json& Line : Lines)
+      if (Match(Line))
+        return &Line;
+    return nullptr;
+  }
+  const json* Event(const std::string& Name) const {
+    return Find([&](const json& Line) { return Line.value("event", "") == Name; });
+  }
+  const json* Answer(const std::string& Name) const {
+    return Find([&](const json& Line) { return Line.value("answer", "") == Name; });
+  }
+  /// The events and answers in order, as "event:NAME" and "answer:NAME",
+  /// without the debugger's console chatter and modules.
+  std::vector<std::string> Sequence() const {
+    std::vector<std::string> Names;
+    for (const json& Line : Lines) {
+      if (Line.contains("answer"))
+        Names.push_back("answer:" + Line["answer"].get<std::string>());
+      else if (Line.contains("event") && Line["event"] != "output" && Line["event"] != "module-loaded" &&
+               Line["event"] != "module-unloaded" && Line["event"] != "running" &&
+               Line["event"] != "thread-created" && Line["event"] != "thread-exited")
+        Names.push_back("event:" + Line["event"].get<std::string>());
+    }
+    return Names;
+  }
+};
+
+std::string ReadAll(const std::string& Path) {
+  std::ifstream Stream(Path);
+  return std::string((std::istreambuf_iterator<char>(Stream)), std::istreambuf_iterator<char>());
+}
+
+std::string Quote(const std::string& Text) { return "'" + Text + "'"; }
+
+class CliTest : public ::testing::Test {
+protected:
+  /// Compiles Source (named Name.c, or Name.cpp with C++) into Scratch.
+  std::string Compile(const std::string& Name, const std::string& Source, bool CPlusPlus = false,
+                      const std::string& Flags = "") {
+    const std::string SourcePath = Scratch.WriteFile(Name + (CPlusPlus ? ".cpp" : ".c"), Source);
+    const std::string Program = Scratch.Path() + "/" + Name;
+    const std::string Command = std::string(CPlusPlus ? "g++" : "gcc") + " -g -O0 " + Flags + " -o " +
+                                Quote(Program) + " " + Quote(SourcePath);
+    if (std::system(Command.c_str()) != 0)
+      return {};
+    return Program;
+  }
+
+  /// Runs `midebug --batch --json --wait LIMIT Arguments` with Commands on
+  /// its standard input.
+  TCliRun RunCli(const std::string& Arguments, const std::string& Commands) {
+    const std::string Input = Scratch.WriteFile("commands.txt", Commands);
+    const std::string Output = Scratch.Path() + "/stdout.txt";
+    const std::string Errors = Scratch.Path() + "/stderr.txt";
+    const std::string Command = "cd " + Quote(Scratch.Path()) + " && " + Quote(MIDEBUG_CLI) +
+                                " --batch --json --wait " + WaitLimit + " " + Arguments + " < " + Quote(Input) +
+                                " > " + Quote(Output) + " 2> " + Quote(Errors);
+    TCliRun Run;
+    const int Status = std::system(Command.c_str());
+    Run.ExitCode = WIFEXITED(Status) ? WEXITSTATUS(Status) : -1;
+    Run.Stdout = ReadAll(Output);
+    Run.Stderr = ReadAll(Errors);
+    std::istringstream Lines(Run.Stdout);
+    for (std::string Line; std::getline(Lines, Line);) {
+      json Object = json::parse(Line, nullptr, false);
+      EXPECT_FALSE(Object.is_discarded()) << "not JSON: " << Line;
+      if (!Object.is_discarded())
+        Run.Lines.push_back(std::move(Object));
+    }
+    return Run;
+  }
+
+  TScratchDir Scratch;
+};
+
+/// A program that prints a marker and exits with 3.
+const char* const ExitThreeSource = "#include <stdio.h>\n"
+                                    "int main(void) { puts(\"marker-7781\"); return 3; }\n";
+
+/// A loop that calls a function; the comments mark the lines the steps
+/// must reach.
+const char* const SteppingSource = "static int square(int value) {\n"
+                                   "  int result = value * value; /* square-body */\n"
+                                   "  return result;\n"
+                                   "}\n"
+                                   "\n"
+                                   "int main(void) {\n"
+                                   "  int total = 0; /* main-first */\n"
+                                   "  for (int i = 1; i <= 2; ++i) /* main-loop */\n"
+                                   "    total += square(i); /* main-call */\n"
+                                   "  return total == 5 ? 4 : 1;\n"
+                                   "}\n";
+
+/// The line of SteppingSource that holds Marker.
+int LineOf(const std::string& Marker) {
+  std::istringstream Lines(SteppingSource);
+  int Number = 0;
+  for (std::string Line; std::getline(Lines, Line);) {
+    ++Number;
+    if (Line.find(Marker) != std::string::npos)
+      return Number;
+  }
+  return -1;
+}
+
+std::string FileName(const json& Object) {
+  return std::filesystem::path(Object.value("file", std::string())).filename().string();
+}
+
+// --- Start-up and the session's own commands ----------------------------------
+
+TEST_F(CliTest, CliStartLoadsTheProgramAndNamesItsLanguageAndCpu) {
+  const std::string Program = Compile("three", ExitThreeSource);
+  ASSERT_FALSE(Program.empty());
+  const TCliRun Run = RunCli(Quote(Program), "quit\n");
+  EXPECT_EQ(Run.ExitCode, 0) << Run.Stderr;
+  const json* Loaded = Run.Event("loaded");
+  ASSERT_NE(Loaded, nullptr) << Run.Stdout;
+  EXPECT_EQ((*Loaded)["program"], Program);
+  EXPECT_EQ((*Loaded)["language"], "c");
+  EXPECT_EQ((*Loaded)["cpu"], "amd64");
+  EXPECT_NE(Run.Answer("quit"), nullptr);
+}
+
+TEST_F(CliTest, CliStartGuessesCxxFromTheSourceBesideTheProgram) {
+  const std::string Program = Compile("plus", "int main() { return 0; }\n", true);
+  ASSERT_FALSE(Program.empty());
+  const TCliRun Run = RunCli(Quote(Program), "");
+  const json* Loaded = Run.Event("loaded");
+  ASSERT_NE(Loaded, nullptr) << Run.Stdout;
+  EXPECT_EQ((*Loaded)["language"], "c++");
+}
+
+TEST_F(CliTest, CliStartOfAMissingProgramIsAnErrorAndFails) {
+  const TCliRun Run = RunCli(Quote(Scratch.Path() + "/no-such-program"), "run\n");
+  EXPECT_NE(Run.ExitCode, 0);
+  ASSERT_EQ(Run.Lines.size(), 1u) << Run.Stdout;
+  EXPECT_EQ(Run.Lines[0]["answer"], "start");
+  EXPECT_NE(Run.Lines[0]["error"].get<std::string>().find("No such file"), std::string::npos) << Run.Stdout;
+}
+
+TEST_F(CliTest, CliStartRejectsAnUnknownOptionWithUsage) {
+  const TCliRun Run = RunCli("--no-such-option prog", "");
+  EXPECT_EQ(Run.ExitCode, 2);
+  EXPECT_NE(Run.Stderr.find("unknown option '--no-such-option'"), std::string::npos) << Run.Stderr;
+  EXPECT_NE(Run.Stderr.find("usage:"), std::string::npos);
+  EXPECT_TRUE(Run.Lines.empty());
+}
+
+TEST_F(CliTest, CliCommandsHelpListsEveryCommand) {
+  const std::string Program = Compile("three", ExitThreeSource);
+  ASSERT_FALSE(Program.empty());
+  const TCliRun Run = RunCli(Quote(Program), "help\n");
+  const json* Help = Run.Answer("help");
+  ASSERT_NE(Help, nullptr) << Run.Stdout;
+  std::vector<std::string> Names;
+  for (const json& Command : (*Help)["commands"])
+    Names.push_back(Command["name"]);
+  for (const char* Expected : {"run", "start", "continue", "next", "step", "finish", "stepi", "nexti", "pause", "bt",
+                               "threads", "thread", "frame", "kill", "detach", "quit", "help"})
+    EXPECT_NE(std::find(Names.begin(), Names.end(), Expected), Names.end()) << Expected;
+}
+
+TEST_F(CliTest, CliCommandsUnknownCommandIsAnErrorAndTheSessionGoesOn) {
+  const std::string Program = Compile("three", ExitThreeSource);
+  ASSERT_FALSE(Program.empty());
+  const TCliRun Run = RunCli(Quote(Program), "frobnicate now\nhelp\n");
+  EXPECT_EQ(Run.ExitCode, 0);
+  const json* Unknown = Run.Answer("frobnicate");
+  ASSERT_NE(Unknown, nullptr) << Run.Stdout;
+  EXPECT_NE((*Unknown)["error"].get<std::string>().find("unknown command 'frobnicate'"), std::string::npos);
+  EXPECT_NE(Run.Answer("help"), nullptr);
+}
+
+TEST_F(CliTest, CliCommandsThatNeedAStoppedProgramSayWhyBeforeRun) {
+  const std::string Program = Compile("three", ExitThreeSource);
+  ASSERT_FALSE(Program.empty());
+  const TCliRun Run = RunCli(Quote(Program), "next\nbt\nthread x\n");
+  for (const char* Name : {"next", "bt"}) {
+    const json* Answer = Run.Answer(Name);
+    ASSERT_NE(Answer, nullptr) << Name;
+    EXPECT_NE((*Answer)["error"].get<std::string>().find("not running"), std::string::npos) << Name;
+  }
+  const json* Thread = Run.Answer("thread");
+  ASSERT_NE(Thread, nullptr);
+  EXPECT_EQ((*Thread)["error"], "usage: thread N");
+}
+
+// --- Running to the exit ---------------------------------------------------------
+
+TEST_F(CliTest, CliRunReachesTheExitWithTheProgramsCodeAndOutput) {
+  const std::string Program = Compile("three", ExitThreeSource);
+  ASSERT_FALSE(Program.empty());
+  const TCliRun Run = RunCli(Quote(Program), "run\ncontinue\n");
+  EXPECT_EQ(Run.ExitCode, 0);
+  const json* Exited = Run.Event("exited");
+  ASSERT_NE(Exited, nullptr) << Run.Stdout << Run.Stderr;
+  EXPECT_EQ((*Exited)["code"], 3);
+  const json* RunAnswer = Run.Answer("run");
+  ASSERT_NE(RunAnswer, nullptr);
+  EXPECT_EQ((*RunAnswer)["state"], "exited");
+  EXPECT_NE(Run.Find([](const json& Line) {
+    return Line.value("event", "") == "output" && Line.value("text", "").find("marker-7781") != std::string::npos;
+  }),
+            nullptr)
+      << Run.Stdout;
+  // After the exit, the session says so instead of resuming.
+  const json* Continue = Run.Answer("continue");
+  ASSERT_NE(Continue, nullptr);
+  EXPECT_EQ((*Continue)["error"], "the program has exited");
+}
+
+TEST_F(CliTest, CliLogKeepsTheMiTrafficInTheNamedFile) {
+  const std::string Program = Compile("three", ExitThreeSource);
+  ASSERT_FALSE(Program.empty());
+  const std::string Log = Scratch.Path() + "/logs/session.log";
+  const TCliRun Run = RunCli("--log " + Quote(Log) + " " + Quote(Program), "quit\n");
+  EXPECT_EQ(Run.ExitCode, 0) << Run.Stderr;
+  const std::string Traffic = ReadAll(Log);
+  EXPECT_NE(Traffic.find("-file-exec-and-symbols"), std::string::npos) << Traffic;
+  // Only the named file remains: the debugger's own log was renamed.
+  size_t Files = 0;
+  for ([[maybe_unused]] const auto& Entry : std::filesystem::directory_iterator(Scratch.Path() + "/logs"))
+    ++Files;
+  EXPECT_EQ(Files, 1u);
+}
+
+TEST_F(CliTest, CliRunPauseInterruptsAProgramThatNeverStopsAndKillEndsIt) {
+  const std::string Program =
+      Compile("busy", "int main(void) { volatile int spins = 0; for (;;) ++spins; }\n");
+  ASSERT_FALSE(Program.empty());
+  // The program never stops by itself, so the run's short wait always ends
+  // unanswered; the later --wait wins over the default.
+  const TCliRun Run = RunCli("--wait 2 " + Quote(Program), "run\npause\nkill\n");
+  const json* RunAnswer = Run.Answer("run");
+  ASSERT_NE(RunAnswer, nullptr) << Run.Stdout;
+  EXPECT_NE((*RunAnswer)["error"].get<std::string>().find("did not stop"), std::string::npos);
+  const json* Stopped = Run.Event("stopped");
+  ASSERT_NE(Stopped, nullptr) << Run.Stdout;
+  // An interruption is a step stop, not a signal.
+  EXPECT_EQ((*Stopped)["reason"], "step");
+  EXPECT_EQ(FileName(*Stopped), "busy.c");
+  const std::vector<std::string> Expected = {"event:loaded", "answer:run",  "event:stopped", "answer:pause",
+                                             "event:exited", "answer:kill"};
+  EXPECT_EQ(Run.Sequence(), Expected) << Run.Stdout;
+}
+
+TEST_F(CliTest, CliRunReportsThreadsThatStartAndEndAfterTheStartStop) {
+  const std::string Program = Compile("workers",
+                                      "#include <pthread.h>\n"
+                                      "static void *work(void *arg) { return arg; }\n"
+                                      "int main(void) {\n"
+                                      "  pthread_t workers[2];\n"
+                                      "  for (int i = 0; i < 2; ++i) pthread_create(&workers[i], 0, work, 0);\n"
+                                      "  for (int i = 0; i < 2; ++i) pthread_join(workers[i], 0);\n"
+                                      "  return 6;\n"
+                                      "}\n",
+                                      false, "-pthread");
+  ASSERT_FALSE(Program.empty());
+  // Threads are followed once the program has stopped at its start.
+  const TCliRun Run = RunCli(Quote(Program), "start\ncontinue\n");
+  std::set<int> Created;
+  std::set<int> Exited;
+  for (const json& Line : Run.Lines) {
+    if (Line.value("event", "") == "thread-created")
+      Created.insert(Line["thread"].get<int>());
+    if (Line.value("event", "") == "thread-exited")
+      Exited.insert(Line["thread"].get<int>());
+  }
+  // The main thread and the two workers.
+  EXPECT_EQ(Created, (std::set<int>{1, 2, 3})) << Run.Stdout;
+  const json* StartAnswer = Run.Answer("start");
+  ASSERT_NE(StartAnswer, nullptr);
+  EXPECT_EQ((*StartAnswer)["state"], "stopped");
+  EXPECT_TRUE(Exited.contains(2) && Exited.contains(3)) << Run.Stdout;
+  const json* ExitedEvent = Run.Event("exited");
+  ASSERT_NE(ExitedEvent, nullptr) << Run.Stdout;
+  EXPECT_EQ((*ExitedEvent)["code"], 6);
+}
+
+TEST_F(CliTest, CliAttachShowsTheStackAndDetachLeavesTheProgramRunning) {
+  const std::string Program = Compile("sleeper", "#include <unistd.h>\n"
+                                                 "int main(void) { for (;;) sleep(1); }\n");
+  ASSERT_FALSE(Program.empty());
+  const std::string Start = "exec " + Quote(Program) + " >/dev/null 2>&1 & echo $!";
+  FILE* Shell = popen(Start.c_str(), "r");
+  ASSERT_NE(Shell, nullptr);
+  int Pid = 0;
+  ASSERT_EQ(std::fscanf(Shell, "%d", &Pid), 1);
+  pclose(Shell);
+  const TCliRun Run = RunCli("--attach " + std::to_string(Pid), "bt\ndetach\n");
+  const bool StillRunning = kill(Pid, 0) == 0;
+  kill(Pid, SIGKILL);
+
+  const json* Attached = Run.Event("attached");
+  ASSERT_NE(Attached, nullptr) << Run.Stdout << Run.Stderr;
+  EXPECT_EQ((*Attached)["pid"], Pid);
+  const json* Backtrace = Run.Answer("bt");
+  ASSERT_NE(Backtrace, nullptr);
+  ASSERT_FALSE(Backtrace->contains("error")) << *Backtrace;
+  const json& Frames = (*Backtrace)["frames"];
+  ASSERT_FALSE(Frames.empty());
+  EXPECT_NE(Frames.back()["header"].get<std::string>().find("main"), std::string::npos) << *Backtrace;
+  EXPECT_EQ(FileName(Frames.back()), "sleeper.c");
+  const json* Detach = Run.Answer("detach");
+  ASSERT_NE(Detach, nullptr);
+  EXPECT_EQ((*Detach)["state"], "detached");
+  EXPECT_TRUE(StillRunning);
+}
+
+// --- Stopping and stepping -------------------------------------------------------
+
+TEST_F(CliTest, CliSteppingStartStopsAtMainsFirstLine) {
+  const std::string Program = Compile("loop", SteppingSource);
+  ASSERT_FALSE(Program.empty());
+  const TCliRun Run = RunCli(Quote(Program), "start\ncontinue\n");
+  const json* Stopped = Run.Event("stopped");
+  ASSERT_NE(Stopped, nullptr) << Run.Stdout << Run.Stderr;
+  EXPECT_EQ((*Stopped)["reason"], "breakpoint");
+  EXPECT_EQ(FileName(*Stopped), "loop.c");
+  EXPECT_EQ((*Stopped)["line"], LineOf("main-first"));
+  EXPECT_NE((*Stopped).value("text", "").find("main-first"), std::string::npos);
+  const json* Exited = Run.Event("exited");
+  ASSERT_NE(Exited, nullptr) << Run.Stdout;
+  EXPECT_EQ((*Exited)["code"], 4);
+}
+
+TEST_F(CliTest, CliSteppingNextStepAndFinishFollowTheSource) {
+  const std::string Program = Compile("loop", SteppingSource);
+  ASSERT_FALSE(Program.empty());
+  const TCliRun Run = RunCli(Quote(Program), "start\nnext\nnext\nstep\nbt\nfinish\ncontinue\n");
+  std::vector<const json*> Stops;
+  for (const json& Line : Run.Lines)
+    if (Line.value("event", "") == "stopped")
+      Stops.push_back(&Line);
+  ASSERT_EQ(Stops.size(), 5u) << Run.Stdout << Run.Stderr;
+  EXPECT_EQ((*Stops[1])["line"], LineOf("main-loop"));
+  EXPECT_EQ((*Stops[1])["reason"], "step");
+  EXPECT_EQ((*Stops[2])["line"], LineOf("main-call"));
+  EXPECT_EQ((*Stops[3])["line"], LineOf("square-body"));
+  // Out of square, back in main's loop line.
+  EXPECT_EQ(FileName(*Stops[4]), "loop.c");
+  EXPECT_EQ((*Stops[4])["line"], LineOf("main-call"));
+
+  const json* Backtrace = Run.Answer("bt");
+  ASSERT_NE(Backtrace, nullptr);
+  ASSERT_FALSE(Backtrace->contains("error")) << *Backtrace;
+  const json& Frames = (*Backtrace)["frames"];
+  ASSERT_EQ(Frames.size(), 2u) << *Backtrace;
+  EXPECT_EQ(Frames[0]["level"], 0);
+  EXPECT_NE(Frames[0]["header"].get<std::string>().find("square"), std::string::npos) << Frames[0];
+  EXPECT_EQ(Frames[0]["line"], LineOf("square-body"));
+  EXPECT_NE(Frames[1]["header"].get<std::string>().find("main"), std::string::npos) << Frames[1];
+  EXPECT_EQ(Frames[1]["line"], LineOf("main-call"));
+
+  const json* Exited = Run.Event("exited");
+  ASSERT_NE(Exited, nullptr);
+  EXPECT_EQ((*Exited)["code"], 4);
+}
+
+TEST_F(CliTest, CliSteppingThreadsAndFrameDescribeTheStoppedProgram) {
+  const std::string Program = Compile("loop", SteppingSource);
+  ASSERT_FALSE(Program.empty());
+  const TCliRun Run = RunCli(Quote(Program), "start\nnext\nnext\nstep\nthreads\nframe 1\nthread 1\nframe 9\nkill\n");
+  const json* Threads = Run.Answer("threads");
+  ASSERT_NE(Threads, nullptr) << Run.Stdout;
+  ASSERT_FALSE(Threads->contains("error")) << *Threads;
+  ASSERT_EQ((*Threads)["threads"].size(), 1u) << *Threads;
+  EXPECT_EQ((*Threads)["threads"][0]["id"], 1);
+  EXPECT_EQ((*Threads)["threads"][0]["state"], "stopped");
+  EXPECT_EQ((*Threads)["threads"][0]["current"], true);
+
+  const json* Frame = Run.Answer("frame");
+  ASSERT_NE(Frame, nullptr);
+  ASSERT_FALSE(Frame->contains("error")) << *Frame;
+  EXPECT_EQ((*Frame)["level"], 1);
+  EXPECT_EQ((*Frame)["line"], LineOf("main-call"));
+
+  const json* Thread = Run.Answer("thread");
+  ASSERT_NE(Thread, nullptr);
+  EXPECT_EQ((*Thread)["thread"], 1);
+  EXPECT_EQ((*Thread)["line"], LineOf("square-body"));
+
+  const json* NoFrame = Run.Find([](const json& Line) { return Line.value("answer", "") == "frame" && Line.contains("error"); });
+  ASSERT_NE(NoFrame, nullptr);
+  EXPECT_EQ((*NoFrame)["error"], "no frame 9");
+
+  const json* Kill = Run.Answer("kill");
+  ASSERT_NE(Kill, nullptr);
+  EXPECT_EQ((*Kill)["state"], "exited") << *Kill;
+}
+
+} // namespace
+} // namespace midebug

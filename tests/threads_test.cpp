@@ -1,0 +1,351 @@
+// Threads and call stacks against the real GDB through the "local" profile:
+// C, C++ and Pascal programs stopped in nested functions, their call-stack
+// header lines, frame locations, and thread and frame selection.
+
+#include "midebug.h"
+#include "testlistener.h"
+#include "testsupport.h"
+
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <cstdlib>
+#include <regex>
+
+namespace midebug {
+namespace {
+
+using test::TScratchDir;
+using test::TTestListener;
+
+TEST(ThreadsState, StrToStateIgnoresLetterCaseAndGivesNoneForAnythingElse) {
+  const std::vector<std::pair<std::string, TThreadState>> Cases = {
+      {"stopped", tsStop},    {"Stopped", tsStop},     {"STOPPED", tsStop},     {"running", tsRunnable},
+      {"RUNNING", tsRunnable}, {"Waiting", tsBlocked},  {"@@zombie", tsZombie},  {"@@ZOMBIE", tsZombie},
+      {"", tsNone},           {"stopped ", tsNone},    {"zombie", tsNone},      {"exited", tsNone},
+  };
+  for (const auto& [Text, State] : Cases)
+    EXPECT_EQ(TGDBThread::StrToState(Text), State) << "'" << Text << "'";
+}
+
+/// A frame header of C and C++: the address in 16 upper-case digits, the
+/// function and its named arguments.
+::testing::AssertionResult IsCHeader(const std::string& Header, const std::string& Call) {
+  static const std::regex Address("^:[0-9A-F]{16} ");
+  if (!std::regex_search(Header, Address))
+    return ::testing::AssertionFailure() << "'" << Header << "' does not start with :ADDRESS";
+  if (Header.substr(18) != Call)
+    return ::testing::AssertionFailure() << "'" << Header << "' does not end in '" << Call << "'";
+  return ::testing::AssertionSuccess();
+}
+
+UInt64 HeaderAddress(const std::string& Header) { return std::stoull(Header.substr(1, 16), nullptr, 16); }
+
+class ThreadsTest : public ::testing::Test {
+protected:
+  void SetUp() override { SetMainThread(); }
+
+  /// Builds Source with Compiler ("gcc -g -O0 -pthread", "fpc -g"...) and
+  /// returns the program's path, or empty.
+  std::string Build(const std::string& Compiler, const std::string& Name, const std::string& Extension,
+                    const std::string& Source, const std::string& Output = " -o ") {
+    const std::string SourcePath = Scratch.WriteFile(Name + Extension, Source);
+    const std::string Program = Scratch.Path() + "/" + Name;
+    const std::string Command = Compiler + Output + "'" + Program + "' '" + SourcePath + "' >/dev/null";
+    return std::system(Command.c_str()) == 0 ? Program : std::string();
+  }
+
+  /// Loads Program under GDB, puts a breakpoint on each of Functions and runs
+  /// it to the first stop.
+  void Launch(const std::string& Program, TGDBLanguage Language, const std::vector<std::string>& Functions) {
+    Process = TGDBProcessManager::CreateProcess(Listener, Program, "", Scratch.Path(), "local", "Linux64", Language,
+                                                gcAMD64, "gdb");
+    ASSERT_TRUE(Process);
+    for (const std::string& Function : Functions)
+      ASSERT_TRUE(Core().ProcessAsyncRequest("-break-insert " + Function));
+    ASSERT_TRUE(Core().ProcessAsyncRequest("-exec-run"));
+    WaitForStop();
+  }
+
+  void Continue() {
+    ASSERT_TRUE(Core().ProcessAsyncRequest("-exec-continue"));
+    WaitForStop();
+  }
+
+  void WaitForStop() {
+    const size_t Before = FStops;
+    ASSERT_TRUE(Listener->PumpUntil([&] { return Stops() > Before; })) << "the program did not stop";
+    FStops = Stops();
+  }
+
+
+  size_t Stops() const {
+    const std::vector<std::string> Calls = Listener->Calls();
+    return static_cast<size_t>(
+        std::count_if(Calls.begin(), Calls.end(), [](const std::string& Call) { return Call.starts_with("Suspended("); }));
+  }
+
+  TGDBProcess& Core() { return *static_cast<TGDBProcess*>(Process.get()); }
+  static TGDBThread& Of(const TIntfPtr<IGDBThread>& Thread) { return *static_cast<TGDBThread*>(Thread.get()); }
+
+  TScratchDir Scratch;
+  TIntfPtr<TTestListener> Listener{new TTestListener};
+  TIntfPtr<IGDBProcess> Process;
+
+private:
+  size_t FStops = 0;
+};
+
+/// The worker stops in inner, called from outer(1, 2), while main waits for
+/// it in finish, called from line 12 whichever way the two threads race.
+const char* const ThreadedC = R"(#include <pthread.h>
+static volatile int Sink, Waiting;
+static void ready(void) { Sink = 0; }
+static int inner(int x) { Sink = x; return x * 2; }
+static int outer(int a, int b) { return inner(a + b); }
+static void *worker(void *arg) { (void)arg; while (!Waiting) {} outer(1, 2); return 0; }
+static void finish(pthread_t t) { Waiting = 1; pthread_join(t, 0); }
+int main(int argc, char **argv) {
+  pthread_t t;
+  ready();
+  pthread_create(&t, 0, worker, 0);
+  finish(t);
+  return argc - 1;
+}
+)";
+
+/// The threaded C program stopped in inner on the worker thread (2), with
+/// both threads in the process's table.
+class ThreadsInC : public ThreadsTest {
+protected:
+  void SetUp() override {
+    ThreadsTest::SetUp();
+    const std::string Program = Build("gcc -g -O0 -pthread", "threaded", ".c", ThreadedC);
+    ASSERT_FALSE(Program.empty());
+    ASSERT_NO_FATAL_FAILURE(Launch(Program, glC, {"ready", "inner"}));
+    MainThread = Process->GetThread(1);
+    ASSERT_FALSE(Of(MainThread).ZombieState());
+    ASSERT_NO_FATAL_FAILURE(Continue());
+    Worker = Process->GetThread(2);
+    ASSERT_FALSE(Of(Worker).ZombieState());
+    ASSERT_EQ(Process->GetSuspendedThreadId(), 2);
+  }
+
+  /// The 1-based number of the first frame of Thread whose header names
+  /// Function, or 0.
+  static Integer FrameOf(const TIntfPtr<IGDBThread>& Thread, const std::string& Function) {
+    for (Integer Index = 1; Index <= Thread->GetCallCount(); ++Index)
+      if (Thread->GetCallHeader(Index).find(" " + Function + "(") != std::string::npos)
+        return Index;
+    return 0;
+  }
+
+  TIntfPtr<IGDBThread> MainThread;
+  TIntfPtr<IGDBThread> Worker;
+};
+
+TEST_F(ThreadsInC, StoppedThreadShowsItsCallsWithNamedArgumentsInnermostFirst) {
+  EXPECT_EQ(Worker->GetStopReason(), tsrAtBreakpoint);
+  const Integer Count = Worker->GetCallCount();
+  ASSERT_GE(Count, 3);
+  EXPECT_TRUE(IsCHeader(Worker->GetCallHeader(1), "inner(x=3)"));
+  EXPECT_TRUE(IsCHeader(Worker->GetCallHeader(2), "outer(a=1, b=2)"));
+  EXPECT_TRUE(IsCHeader(Worker->GetCallHeader(3), "worker(arg=0x0)"));
+  EXPECT_EQ(Of(Worker).GetCallParams(2), (TStringArray{"a", "b"}));
+
+  const TGDBLocation Inner = Worker->GetCallLocation(1);
+  EXPECT_EQ(Inner.Line, 4);
+  EXPECT_TRUE(Inner.Source.ends_with("threaded.c")) << Inner.Source;
+  EXPECT_EQ(Inner.Address, HeaderAddress(Worker->GetCallHeader(1)));
+  EXPECT_EQ(Worker->GetCallLocation(2).Line, 5);
+  EXPECT_EQ(Worker->GetCallLocation(3).Line, 6);
+  EXPECT_EQ(Worker->GetCallCount(), Count) << "the count after the fetch is the number of frames fetched";
+}
+
+TEST_F(ThreadsInC, FrameNumbersOutsideTheStackGiveEmptyValues) {
+  const Integer Count = Worker->GetCallCount();
+  for (const Integer Index : {0, -1, Count + 1, 10000}) {
+    EXPECT_EQ(Worker->GetCallHeader(Index), "") << Index;
+    EXPECT_EQ(Worker->GetCallLocation(Index).Address, 0u) << Index;
+    EXPECT_TRUE(Of(Worker).GetCallParams(Index).empty()) << Index;
+  }
+  EXPECT_NE(Worker->GetCallHeader(Count), "");
+}
+
+TEST_F(ThreadsInC, AnotherThreadsStackIsItsOwnAndSelectingItMovesTheDebugger) {
+  ASSERT_NE(Worker->GetCallHeader(1), "");
+  const Integer Main = FrameOf(MainThread, "main");
+  ASSERT_GT(Main, 1) << "main waits in pthread_join";
+  EXPECT_EQ(Process->GetSuspendedThreadId(), 1);
+  EXPECT_TRUE(IsCHeader(MainThread->GetCallHeader(Main), MainThread->GetCallHeader(Main).substr(18)));
+  EXPECT_TRUE(MainThread->GetCallHeader(Main).substr(18).starts_with("main(argc=1, argv=0x"));
+  EXPECT_EQ(FrameOf(MainThread, "inner"), 0);
+  EXPECT_EQ(MainThread->GetCallLocation(Main).Line, 12);
+
+  // The worker's stack stays cached: asking for it again does not give the
+  // main thread's.
+  EXPECT_TRUE(IsCHeader(Worker->GetCallHeader(1), "inner(x=3)"));
+}
+
+TEST_F(ThreadsInC, SelectedFrameIsWhereTheDebuggerActsUntilTheThreadIsSelectedAgain) {
+  const Integer Main = FrameOf(MainThread, "main");
+  ASSERT_GT(Main, 1);
+  Of(MainThread).SetAsSuspendedThread();
+  Of(MainThread).SelectFrame(Main);
+  EXPECT_EQ(Of(MainThread).FFrameIndex, Main - 1);
+  EXPECT_EQ(MainThread->GetCurrentLocation().Line, 12);
+  EXPECT_EQ(Core().GetCurrentLocation().Line, 12) << "the debugger's frame is main's";
+
+  Of(Worker).SetAsSuspendedThread();
+  EXPECT_EQ(Process->GetSuspendedThreadId(), 2);
+  EXPECT_EQ(Core().GetCurrentLocation().Line, 4);
+
+  Of(MainThread).SetAsSuspendedThread();
+  EXPECT_EQ(Process->GetSuspendedThreadId(), 1);
+  EXPECT_EQ(Of(MainThread).FFrameIndex, 0);
+  EXPECT_EQ(Core().GetCurrentLocation().Address, MainThread->GetCallLocation(1).Address)
+      << "back at the innermost frame in the debugger";
+}
+
+TEST_F(ThreadsInC, FrameSelectionOutsideTheStackChangesNothing) {
+  const Integer Count = Worker->GetCallCount();
+  Of(Worker).SelectFrame(2);
+  ASSERT_EQ(Of(Worker).FFrameIndex, 1);
+  for (const Integer Frame : {0, -3, Count + 1}) {
+    Of(Worker).SelectFrame(Frame);
+    EXPECT_EQ(Of(Worker).FFrameIndex, 1) << Frame;
+  }
+  EXPECT_EQ(Core().GetCurrentLocation().Line, 5) << "still in outer";
+}
+
+TEST_F(ThreadsInC, UnknownThreadNumbersGiveTheZombieWhichHasNoStack) {
+  const TIntfPtr<IGDBThread> Unknown = Process->GetThread(99);
+  EXPECT_EQ(Unknown->GetState(), tsZombie);
+  EXPECT_EQ(Unknown->GetCallCount(), 0);
+  EXPECT_EQ(Unknown->GetCallHeader(1), "");
+  EXPECT_EQ(Process->GetSuspendedThreadId(), 2) << "asking the zombie does not move the debugger";
+  EXPECT_TRUE(IsCHeader(Worker->GetCallHeader(1), "inner(x=3)"));
+
+  // Nor does it show whatever thread the debugger is on when the process
+  // has no current thread.
+  Core().NotifyThreadExited(1);
+  Core().SetSuspendedThread(1);
+  ASSERT_EQ(Process->GetSuspendedThreadId(), -1);
+  EXPECT_EQ(Unknown->GetCallCount(), 0);
+  EXPECT_EQ(Unknown->GetCallHeader(1), "");
+}
+
+TEST_F(ThreadsInC, SelectingThreadsTheDebuggerOrTheTableDoesNotKnow) {
+  // GDB refuses a number it does not know: its current thread stays, and so
+  // does the process's.
+  Core().SetSuspendedThread(7);
+  EXPECT_EQ(Process->GetSuspendedThreadId(), 2);
+
+  // A thread GDB knows but the table does not leaves no current thread.
+  Core().NotifyThreadExited(1);
+  Core().SetSuspendedThread(1);
+  EXPECT_EQ(Process->GetSuspendedThreadId(), -1);
+
+  Core().SetSuspendedThread(2);
+  EXPECT_EQ(Process->GetSuspendedThreadId(), 2);
+  EXPECT_EQ(Worker->GetCurrentLocation().Line, 4);
+}
+
+TEST_F(ThreadsInC, ThreadsKnowTheirNamesAndStatesAtAStop) {
+  EXPECT_EQ(MainThread->GetState(), tsStop);
+  EXPECT_EQ(Worker->GetState(), tsStop);
+  EXPECT_NE(MainThread->GetName(), "");
+}
+
+TEST_F(ThreadsInC, SteppingAThreadStepsThatThreadEvenWhenAnotherIsCurrent) {
+  Of(MainThread).SetAsSuspendedThread();
+  ASSERT_EQ(Process->GetSuspendedThreadId(), 1);
+  Worker->StepOut();
+  ASSERT_NO_FATAL_FAILURE(WaitForStop());
+  EXPECT_EQ(Process->GetSuspendedThreadId(), 2);
+  EXPECT_TRUE(IsCHeader(Worker->GetCallHeader(1), "outer(a=1, b=2)")) << "the stack is fetched anew after a stop";
+  EXPECT_EQ(Worker->GetCallLocation(1).Line, 5);
+}
+
+TEST_F(ThreadsInC, ARunningProgramsThreadsReportNoStopReason) {
+  ASSERT_EQ(Worker->GetStopReason(), tsrAtBreakpoint);
+  ASSERT_TRUE(Core().ProcessAsyncRequest("-exec-continue"));
+  ASSERT_TRUE(Listener->PumpUntilCall("Exited("));
+  EXPECT_EQ(Worker->GetStopReason(), tsrNotStopped);
+}
+
+const char* const NestedCpp = R"(struct Calc {
+  int base;
+  int twice(int n) { return base + n * 2; }
+};
+static int apply(Calc &c, int n) { return c.twice(n); }
+int main() {
+  Calc c{1};
+  return apply(c, 21) == 43 ? 0 : 1;
+}
+)";
+
+TEST_F(ThreadsTest, CppFramesShowQualifiedNamesAndEmptyParenthesesWithoutArguments) {
+  const std::string Program = Build("g++ -g -O0", "nested", ".cpp", NestedCpp);
+  ASSERT_FALSE(Program.empty());
+  ASSERT_NO_FATAL_FAILURE(Launch(Program, glCPP, {"Calc::twice"}));
+  const TIntfPtr<IGDBThread> Thread = Process->GetThread(1);
+  Core().SetSuspendedThread(1);
+  ASSERT_EQ(Process->GetSuspendedThreadId(), 1);
+  EXPECT_EQ(Thread->GetCurrentLocation().Line, 3) << "the selection's reply gives the location";
+
+  ASSERT_EQ(Thread->GetCallCount(), 3);
+  const std::string Twice = Thread->GetCallHeader(1);
+  EXPECT_TRUE(std::regex_match(Twice, std::regex(":[0-9A-F]{16} Calc::twice\\(this=0x[0-9a-f]+, n=21\\)"))) << Twice;
+  EXPECT_TRUE(std::regex_match(Thread->GetCallHeader(2),
+                               std::regex(":[0-9A-F]{16} apply\\(c=@0x[0-9a-f]+: \\{base = 1\\}, n=21\\)")))
+      << Thread->GetCallHeader(2);
+  EXPECT_TRUE(IsCHeader(Thread->GetCallHeader(3), "main()"));
+  EXPECT_EQ(Thread->GetCallLocation(3).Line, 8);
+}
+
+const char* const CallsPascal = R"(program calls;
+function Add(A, B: Integer): Integer;
+begin
+  Add := A + B;
+end;
+procedure Show;
+begin
+  WriteLn(Add(1, 2));
+end;
+procedure Bye;
+begin
+  WriteLn('bye');
+end;
+begin
+  AddExitProc(@Bye);
+  Show;
+end.
+)";
+
+TEST_F(ThreadsTest, PascalFramesShowArgumentValuesAndAnAddressWhereSourceIsMissing) {
+  const std::string Program = Build("fpc -g", "calls", ".pas", CallsPascal, " -o");
+  ASSERT_FALSE(Program.empty());
+  ASSERT_NO_FATAL_FAILURE(Launch(Program, glPascal, {"ADD", "BYE"}));
+  TIntfPtr<IGDBThread> Thread = Process->GetThread(1);
+  Core().SetSuspendedThread(1);
+
+  ASSERT_EQ(Thread->GetCallCount(), 3);
+  EXPECT_EQ(Thread->GetCallHeader(1), "ADD(1,2)");
+  EXPECT_EQ(Thread->GetCallHeader(2), "SHOW") << "no parentheses without arguments";
+  EXPECT_EQ(Thread->GetCallHeader(3), "main");
+  EXPECT_EQ(Thread->GetCallLocation(1).Line, 4);
+  EXPECT_EQ(Of(Thread).GetCallParams(1), (TStringArray{"A", "B"}));
+
+  // The exit procedure is called by the run-time library, which has no line
+  // information.
+  ASSERT_NO_FATAL_FAILURE(Continue());
+  EXPECT_EQ(Process->GetSuspendedThreadId(), 1);
+  EXPECT_EQ(Thread->GetCallHeader(1), "BYE");
+  const std::string Runtime = Thread->GetCallHeader(2);
+  EXPECT_TRUE(std::regex_match(Runtime, std::regex(":[0-9A-F]{16} SYSTEM_\\$\\$_DOEXITPROC"))) << Runtime;
+  EXPECT_EQ(HeaderAddress(Runtime), Thread->GetCallLocation(2).Address);
+}
+
+} // namespace
+} // namespace midebug

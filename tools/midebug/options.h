@@ -1,0 +1,59 @@
+#pragma once
+/// \file
+/// The command line of the console debugger and the guesses it makes about
+/// the program it debugs.
+
+#include "midebug.h"
+
+#include <optional>
+#include <string>
+#include <vector>
+
+namespace midebug::cli {
+
+/// What the command line asks for.
+struct TCliOptions {
+  std::string Program;
+  std::vector<std::string> Arguments;
+  /// The process to attach to; 0 when a program is launched.
+  Integer AttachPid = 0;
+  std::string Profile = "local";
+  std::string Debugger = "gdb";
+  /// True when --debugger was given (attaching then bypasses the profile).
+  bool DebuggerGiven = false;
+  std::optional<TGDBLanguage> Language;
+  std::optional<TGDBCPU> CPU;
+  std::string Platform = "Linux64";
+  std::string ScriptFile;
+  bool Batch = false;
+  bool Json = false;
+  std::string LogFile;
+  /// How long a command that resumes the program waits for it to stop.
+  int WaitSeconds = 60;
+  bool ShowUsage = false;
+};
+
+/// The usage text printed by --help and on a command-line error.
+extern const char* const UsageText;
+
+/// Reads argv into Options; false with Error set when it is malformed.
+bool ParseOptions(int ArgCount, char** Args, TCliOptions& Options, std::string& Error);
+
+/// The source language of Program: a sibling source file's extension
+/// ("hello" beside "hello.pas"), else symbols typical of the Free Pascal or
+/// C++ run-time libraries, else C.
+TGDBLanguage GuessLanguage(const std::string& Program);
+
+/// The CPU of an ELF file, from the machine field of its header; amd64 when
+/// the file is not an ELF file of a known machine.
+TGDBCPU GuessCPU(const std::string& Program);
+
+/// Program arguments joined as the debugger's argument line: an argument
+/// holding blanks or quotes is quoted.
+std::string JoinArguments(const std::vector<std::string>& Arguments);
+
+/// The language's name as the command line spells it.
+std::string LanguageName(TGDBLanguage Language);
+std::string CPUName(TGDBCPU CPU);
+
+} // namespace midebug::cli

@@ -1,0 +1,527 @@
+// The console debugger's session: start-up, the commands and the end.
+
+#include "session.h"
+
+#include <chrono>
+#include <cstdlib>
+#include <filesystem>
+#include <sstream>
+
+namespace midebug::cli {
+
+namespace {
+
+/// How long the end of a session waits for the program to go after kill.
+constexpr std::chrono::milliseconds EndWait(5000);
+/// One pump of the main-thread queue while a command waits.
+constexpr std::chrono::milliseconds PumpSlice(20);
+
+const char* const DebuggerLogPrefix = "gdb_";
+const char* const DebuggerLogSuffix = ".log";
+
+std::vector<std::string> SplitWords(const std::string& Line) {
+  std::istringstream Stream(Line);
+  std::vector<std::string> Words;
+  for (std::string Word; Stream >> Word;)
+    Words.push_back(Word);
+  return Words;
+}
+
+bool ParseNumber(const std::string& Text, Integer& Value) {
+  if (Text.empty() || Text.size() > 9 || Text.find_first_not_of("0123456789") != std::string::npos)
+    return false;
+  Value = std::stoi(Text);
+  return true;
+}
+
+std::string ThreadStateWord(TThreadState State) {
+  switch (State) {
+  case tsStop:
+    return "stopped";
+  case tsRunnable:
+    return "running";
+  case tsBlocked:
+    return "blocked";
+  case tsZombie:
+    return "zombie";
+  case tsNone:
+  default:
+    return "none";
+  }
+}
+
+std::string HexAddress(UInt64 Address) {
+  std::ostringstream Stream;
+  Stream << "0x" << std::hex << Address;
+  return Stream.str();
+}
+
+/// The debugger logs in Dir.
+std::set<std::string> DebuggerLogs(const std::string& Dir) {
+  std::set<std::string> Logs;
+  std::error_code Ignored;
+  for (const auto& Entry : std::filesystem::directory_iterator(Dir, Ignored)) {
+    const std::string Name = Entry.path().filename().string();
+    if (Name.starts_with(DebuggerLogPrefix) && Name.ends_with(DebuggerLogSuffix))
+      Logs.insert(Entry.path().string());
+  }
+  return Logs;
+}
+
+} // namespace
+
+TCliSession::TCliSession(const TCliOptions& Options, TCliOutput& Output)
+    : FOptions(Options), FOutput(Output), FListener(new TCliListener(this)) {}
+
+TCliSession::~TCliSession() { End(); }
+
+const std::vector<TCliSession::TCommandEntry>& TCliSession::Commands() {
+  static const std::vector<TCommandEntry> Table = {
+      {"run", &TCliSession::CmdRun, "run", "start the program and wait until it stops or exits"},
+      {"start", &TCliSession::CmdStart, "start", "start the program and stop at main"},
+      {"continue", &TCliSession::CmdContinue, "continue", "resume the stopped program"},
+      {"next", &TCliSession::CmdStep, "next", "step over one source line"},
+      {"step", &TCliSession::CmdStep, "step", "step into one source line"},
+      {"finish", &TCliSession::CmdStep, "finish", "run until the current function returns"},
+      {"stepi", &TCliSession::CmdStep, "stepi", "step one instruction, into calls"},
+      {"nexti", &TCliSession::CmdStep, "nexti", "step one instruction, over calls"},
+      {"pause", &TCliSession::CmdPause, "pause", "interrupt the running program"},
+      {"bt", &TCliSession::CmdBacktrace, "bt", "the call stack of the current thread (frame 0 innermost)"},
+      {"threads", &TCliSession::CmdThreads, "threads", "the program's threads"},
+      {"thread", &TCliSession::CmdThread, "thread N", "make thread N the current thread"},
+      {"frame", &TCliSession::CmdFrame, "frame N", "show frame N of the current thread and select it"},
+      {"kill", &TCliSession::CmdKill, "kill", "end the program"},
+      {"detach", &TCliSession::CmdDetach, "detach", "let the program go on without the debugger"},
+      {"quit", &TCliSession::CmdQuit, "quit", "end the session (a launched program is killed, an attached one detached)"},
+      {"help", &TCliSession::CmdHelp, "help", "this list"},
+  };
+  return Table;
+}
+
+bool TCliSession::Start() {
+  if (!FOptions.LogFile.empty()) {
+    namespace fs = std::filesystem;
+    std::error_code Ignored;
+    FLogDir = fs::absolute(FOptions.LogFile, Ignored).parent_path().string();
+    fs::create_directories(FLogDir, Ignored);
+    FLogsBefore = DebuggerLogs(FLogDir);
+    // The debugger's transport reads these when it starts.
+    ::setenv("GDB_DEBUG", "1", 1);
+    ::setenv("GDB_OUTDIR", FLogDir.c_str(), 1);
+  }
+  try {
+    if (FOptions.AttachPid != 0) {
+      const TGDBLanguage Language = FOptions.Language.value_or(glC);
+      const TGDBCPU CPU = FOptions.CPU.value_or(GuessCPU("/proc/" + std::to_string(FOptions.AttachPid) + "/exe"));
+      FProcess = FOptions.DebuggerGiven
+                     ? TGDBProcessManager::AttachProcess(FListener, FOptions.AttachPid, FOptions.Platform, Language,
+                                                         CPU, FOptions.Debugger)
+                     : TGDBProcessManager::AttachProcess(FListener, FOptions.AttachPid, FOptions.Profile,
+                                                         FOptions.Platform, Language, CPU);
+      // An attached program is stopped where the debugger caught it; the stop
+      // reaches the listener a little later, and the first command needs it.
+      FState = TRunState::Stopped;
+      FOutput.Emit({{"event", "attached"}, {"pid", FOptions.AttachPid}},
+                   "Attached to process " + std::to_string(FOptions.AttachPid));
+      PumpUntilStopAfter(0, std::chrono::seconds(FOptions.WaitSeconds));
+      return true;
+    }
+    const TGDBLanguage Language = FOptions.Language.value_or(GuessLanguage(FOptions.Program));
+    const TGDBCPU CPU = FOptions.CPU.value_or(GuessCPU(FOptions.Program));
+    FProcess = TGDBProcessManager::CreateProcess(FListener, FOptions.Program, JoinArguments(FOptions.Arguments),
+                                                 GetCurrentDir(), FOptions.Profile, FOptions.Platform, Language, CPU,
+                                                 FOptions.Debugger);
+    FState = TRunState::Loaded;
+    FOutput.Emit({{"event", "loaded"},
+                  {"program", FOptions.Program},
+                  {"language", LanguageName(Language)},
+                  {"cpu", CPUName(CPU)}},
+                 "Loaded " + FOptions.Program + " (" + LanguageName(Language) + ", " + CPUName(CPU) +
+                     "). Type 'start' to stop at main, 'run' to run it, 'help' for the commands.");
+    return true;
+  } catch (const std::exception& Error) {
+    FOutput.Error("start", Error.what());
+    return false;
+  }
+}
+
+bool TCliSession::Execute(const std::string& Line) {
+  std::vector<std::string> Words = SplitWords(Line.substr(0, Line.find('#')));
+  if (Words.empty())
+    return true;
+  const std::string Name = Words.front();
+  Words.erase(Words.begin());
+  for (const TCommandEntry& Entry : Commands()) {
+    if (Name != Entry.Name)
+      continue;
+    try {
+      (this->*Entry.Handler)(Name, Words);
+    } catch (const std::exception& Error) {
+      // The library raises at its boundary when the debugger fails.
+      FOutput.Error(Name, Error.what());
+    }
+    return !FQuit;
+  }
+  FOutput.Error(Name, "unknown command '" + Name + "'; 'help' lists the commands");
+  return true;
+}
+
+void TCliSession::End() {
+  if (FProcess) {
+    try {
+      // As GDB does: a program that was attached to goes on, one that was
+      // launched ends with the session.
+      if (FOptions.AttachPid != 0 && FState == TRunState::Stopped) {
+        FProcess->Detach();
+        FState = TRunState::Detached;
+      } else if (FState == TRunState::Stopped || FState == TRunState::Running) {
+        const uint64_t Before = FStopCount;
+        FProcess->Terminate();
+        PumpUntilStopAfter(Before, EndWait);
+      }
+    } catch (const std::exception& Error) {
+      FOutput.Error("quit", Error.what());
+    }
+    // Releasing the process stops the debugger and closes its log.
+    FProcess = nullptr;
+    ProcessPending();
+  }
+  FListener->Forget();
+  KeepLog();
+}
+
+void TCliSession::KeepLog() {
+  if (FLogDir.empty())
+    return;
+  namespace fs = std::filesystem;
+  std::string Newest;
+  fs::file_time_type NewestTime{};
+  for (const std::string& Log : DebuggerLogs(FLogDir)) {
+    std::error_code Ignored;
+    const fs::file_time_type Time = fs::last_write_time(Log, Ignored);
+    if (FLogsBefore.contains(Log) || Ignored || (!Newest.empty() && Time < NewestTime))
+      continue;
+    Newest = Log;
+    NewestTime = Time;
+  }
+  FLogDir.clear();
+  if (Newest.empty()) {
+    FOutput.Error("log", "the debugger wrote no log in " + fs::path(FOptions.LogFile).parent_path().string());
+    return;
+  }
+  std::error_code Failure;
+  fs::rename(Newest, FOptions.LogFile, Failure);
+  if (Failure)
+    FOutput.Error("log", "cannot rename " + Newest + " to " + FOptions.LogFile + ": " + Failure.message());
+}
+
+// --- Waiting -----------------------------------------------------------------
+
+bool TCliSession::PumpUntilStopAfter(uint64_t Before, std::chrono::milliseconds Limit) {
+  const auto Deadline = std::chrono::steady_clock::now() + Limit;
+  while (FStopCount == Before) {
+    if (std::chrono::steady_clock::now() >= Deadline)
+      return false;
+    WaitAndProcess(PumpSlice);
+  }
+  // Events raised together with the stop (program output, thread exits)
+  // are printed before the next command is read.
+  ProcessPending();
+  return true;
+}
+
+namespace {
+
+std::string RunStateWord(TRunState State) {
+  switch (State) {
+  case TRunState::Loaded:
+    return "loaded";
+  case TRunState::Running:
+    return "running";
+  case TRunState::Stopped:
+    return "stopped";
+  case TRunState::Exited:
+    return "exited";
+  case TRunState::Detached:
+    return "detached";
+  case TRunState::Lost:
+  default:
+    return "lost";
+  }
+}
+
+} // namespace
+
+void TCliSession::ResumeAndWait(const std::string& Name, const std::function<void()>& Resume) {
+  // Counted before resuming, so that a stop reported during the resuming
+  // call itself is not missed.
+  const uint64_t Before = FStopCount;
+  Resume();
+  if (!PumpUntilStopAfter(Before, std::chrono::seconds(FOptions.WaitSeconds))) {
+    // Still running as far as anyone knows: 'pause' and 'kill' now apply.
+    if (Name != "pause" && Name != "kill")
+      FState = TRunState::Running;
+    FOutput.Error(Name, "the program did not stop within " + std::to_string(FOptions.WaitSeconds) + " s; " +
+                            "'pause' interrupts it");
+    return;
+  }
+  FOutput.Emit({{"answer", Name}, {"state", RunStateWord(FState)}}, "");
+}
+
+// --- Commands ----------------------------------------------------------------
+
+bool TCliSession::RequireStopped(const std::string& Name) {
+  switch (FState) {
+  case TRunState::Stopped:
+    return true;
+  case TRunState::Loaded:
+    FOutput.Error(Name, "the program is not running; use 'run' or 'start'");
+    return false;
+  case TRunState::Running:
+    FOutput.Error(Name, "the program is running");
+    return false;
+  case TRunState::Exited:
+    FOutput.Error(Name, "the program has exited");
+    return false;
+  case TRunState::Detached:
+    FOutput.Error(Name, "the program was detached");
+    return false;
+  case TRunState::Lost:
+  default:
+    FOutput.Error(Name, "the debugger is gone");
+    return false;
+  }
+}
+
+TIntfPtr<IGDBThread> TCliSession::CurrentThread(const std::string& Name) {
+  if (FCurrentThread < 0)
+    FCurrentThread = FProcess->GetSuspendedThreadId();
+  TIntfPtr<IGDBThread> Thread = FCurrentThread < 0 ? nullptr : FProcess->GetThread(FCurrentThread);
+  if (!Thread)
+    FOutput.Error(Name, "no current thread");
+  return Thread;
+}
+
+void TCliSession::CmdRun(const std::string& Name, const std::vector<std::string>& /*Arguments*/) {
+  if (FState != TRunState::Loaded) {
+    FOutput.Error(Name, "the program was already started (state: " + RunStateWord(FState) + ")");
+    return;
+  }
+  ResumeAndWait(Name, [this] { FProcess->Run(); });
+}
+
+void TCliSession::CmdStart(const std::string& Name, const std::vector<std::string>& /*Arguments*/) {
+  if (FState != TRunState::Loaded) {
+    FOutput.Error(Name, "the program was already started (state: " + RunStateWord(FState) + ")");
+    return;
+  }
+  if (!FProcess->SetRunToMainBreakpoint())
+    FOutput.Emit({{"event", "warning"}, {"message", "no main function found; running"}},
+                 "warning: no main function found; running");
+  ResumeAndWait(Name, [this] { FProcess->Run(); });
+}
+
+void TCliSession::CmdContinue(const std::string& Name, const std::vector<std::string>& /*Arguments*/) {
+  if (!RequireStopped(Name))
+    return;
+  ResumeAndWait(Name, [this] { FProcess->Resume(); });
+}
+
+void TCliSession::CmdStep(const std::string& Name, const std::vector<std::string>& /*Arguments*/) {
+  if (!RequireStopped(Name))
+    return;
+  TIntfPtr<IGDBThread> Thread = CurrentThread(Name);
+  if (!Thread)
+    return;
+  ResumeAndWait(Name, [&] {
+    if (Name == "next")
+      Thread->StepOver();
+    else if (Name == "step")
+      Thread->StepInto();
+    else if (Name == "finish")
+      Thread->StepOut();
+    else if (Name == "stepi")
+      Thread->InstStepInto();
+    else
+      Thread->InstStepOver();
+  });
+}
+
+void TCliSession::CmdPause(const std::string& Name, const std::vector<std::string>& /*Arguments*/) {
+  if (FState != TRunState::Running) {
+    FOutput.Error(Name, "the program is not running");
+    return;
+  }
+  ResumeAndWait(Name, [this] { FProcess->Pause(); });
+}
+
+void TCliSession::CmdBacktrace(const std::string& Name, const std::vector<std::string>& /*Arguments*/) {
+  if (!RequireStopped(Name))
+    return;
+  TIntfPtr<IGDBThread> Thread = CurrentThread(Name);
+  if (!Thread)
+    return;
+  const Integer Count = Thread->GetCallCount();
+  nlohmann::json Frames = nlohmann::json::array();
+  std::string Text;
+  for (Integer Index = 1; Index <= Count; ++Index) {
+    const std::string Header = Thread->GetCallHeader(Index);
+    const TGDBLocation Location = Thread->GetCallLocation(Index);
+    nlohmann::json Frame = {{"level", Index - 1}, {"header", Header}};
+    Frame.update(LocationJson(Location));
+    Frames.push_back(Frame);
+    Text += (Index - 1 == FCurrentFrame ? "* #" : "  #") + std::to_string(Index - 1) + "  " + Header + " at " +
+            LocationText(Location) + "\n";
+  }
+  if (Count <= 0)
+    Text = "No stack.";
+  FOutput.Emit({{"answer", Name}, {"thread", FCurrentThread}, {"frames", Frames}}, Text);
+}
+
+void TCliSession::CmdThreads(const std::string& Name, const std::vector<std::string>& /*Arguments*/) {
+  if (!RequireStopped(Name))
+    return;
+  // The interfaces list no threads: the session knows them from the events
+  // and from the stops.
+  std::set<Integer> Ids = FThreads;
+  if (const Integer Suspended = FProcess->GetSuspendedThreadId(); Suspended >= 0)
+    Ids.insert(Suspended);
+  nlohmann::json Threads = nlohmann::json::array();
+  std::string Text;
+  for (const Integer Id : Ids) {
+    TIntfPtr<IGDBThread> Thread = FProcess->GetThread(Id);
+    if (!Thread || Thread->GetId() != Id)
+      continue;
+    const TGDBLocation Location = Thread->GetCurrentLocation();
+    nlohmann::json Entry = {{"id", Id},
+                            {"name", Thread->GetName()},
+                            {"state", ThreadStateWord(Thread->GetState())},
+                            {"current", Id == FCurrentThread}};
+    Entry.update(LocationJson(Location));
+    Threads.push_back(Entry);
+    Text += (Id == FCurrentThread ? "* " : "  ") + std::to_string(Id) + "  " + Thread->GetName() + "  " +
+            ThreadStateWord(Thread->GetState()) + "  " + LocationText(Location) + "\n";
+  }
+  if (Threads.empty())
+    Text = "No threads.";
+  FOutput.Emit({{"answer", Name}, {"current", FCurrentThread}, {"threads", Threads}}, Text);
+}
+
+void TCliSession::CmdThread(const std::string& Name, const std::vector<std::string>& Arguments) {
+  Integer Id = 0;
+  if (Arguments.size() != 1 || !ParseNumber(Arguments[0], Id)) {
+    FOutput.Error(Name, "usage: thread N");
+    return;
+  }
+  if (!RequireStopped(Name))
+    return;
+  TIntfPtr<IGDBThread> Thread = FProcess->GetThread(Id);
+  if (!Thread || Thread->GetId() != Id) {
+    FOutput.Error(Name, "no thread " + std::to_string(Id));
+    return;
+  }
+  FCurrentThread = Id;
+  FCurrentFrame = 0;
+  const TGDBLocation Location = Thread->GetCurrentLocation();
+  nlohmann::json Answer = {{"answer", Name}, {"thread", Id}, {"name", Thread->GetName()}};
+  Answer.update(LocationJson(Location));
+  std::string Text = "Thread " + std::to_string(Id) + " (" + Thread->GetName() + ") at " + LocationText(Location);
+  if (const std::string Source = SourceText(Location); !Source.empty())
+    Text += "\n" + Source;
+  FOutput.Emit(Answer, Text);
+}
+
+void TCliSession::CmdFrame(const std::string& Name, const std::vector<std::string>& Arguments) {
+  Integer Level = 0;
+  if (Arguments.size() != 1 || !ParseNumber(Arguments[0], Level)) {
+    FOutput.Error(Name, "usage: frame N (0 is the innermost frame)");
+    return;
+  }
+  if (!RequireStopped(Name))
+    return;
+  TIntfPtr<IGDBThread> Thread = CurrentThread(Name);
+  if (!Thread)
+    return;
+  if (Level >= Thread->GetCallCount()) {
+    FOutput.Error(Name, "no frame " + std::to_string(Level));
+    return;
+  }
+  // The interfaces take the frame with each question that needs one; the
+  // session remembers the choice for the commands that will ask them.
+  FCurrentFrame = Level;
+  const std::string Header = Thread->GetCallHeader(Level + 1);
+  const TGDBLocation Location = Thread->GetCallLocation(Level + 1);
+  nlohmann::json Answer = {{"answer", Name}, {"thread", FCurrentThread}, {"level", Level}, {"header", Header}};
+  Answer.update(LocationJson(Location));
+  std::string Text = "#" + std::to_string(Level) + "  " + Header + " at " + LocationText(Location);
+  if (const std::string Source = SourceText(Location); !Source.empty())
+    Text += "\n" + Source;
+  FOutput.Emit(Answer, Text);
+}
+
+void TCliSession::CmdKill(const std::string& Name, const std::vector<std::string>& /*Arguments*/) {
+  if (FState != TRunState::Stopped && FState != TRunState::Running) {
+    FOutput.Error(Name, "the program is not running");
+    return;
+  }
+  ResumeAndWait(Name, [this] { FProcess->Terminate(); });
+}
+
+void TCliSession::CmdDetach(const std::string& Name, const std::vector<std::string>& /*Arguments*/) {
+  if (!RequireStopped(Name))
+    return;
+  FProcess->Detach();
+  FState = TRunState::Detached;
+  FOutput.Emit({{"answer", Name}, {"state", RunStateWord(FState)}}, "Detached; the program goes on.");
+}
+
+void TCliSession::CmdQuit(const std::string& Name, const std::vector<std::string>& /*Arguments*/) {
+  FQuit = true;
+  FOutput.Emit({{"answer", Name}}, "");
+}
+
+void TCliSession::CmdHelp(const std::string& Name, const std::vector<std::string>& /*Arguments*/) {
+  nlohmann::json List = nlohmann::json::array();
+  std::string Text = "Commands:\n";
+  for (const TCommandEntry& Entry : Commands()) {
+    List.push_back({{"name", Entry.Name}, {"usage", Entry.Usage}, {"help", Entry.Help}});
+    std::string Usage = Entry.Usage;
+    Usage.resize(std::max<size_t>(Usage.size(), 10), ' ');
+    Text += "  " + Usage + "  " + Entry.Help + "\n";
+  }
+  FOutput.Emit({{"answer", Name}, {"commands", List}}, Text);
+}
+
+// --- Locations ---------------------------------------------------------------
+
+nlohmann::json TCliSession::LocationJson(const TGDBLocation& Location) const {
+  nlohmann::json Fields = nlohmann::json::object();
+  if (!Location.Source.empty())
+    Fields["file"] = Location.Source;
+  if (Location.Line > 0)
+    Fields["line"] = Location.Line;
+  if (Location.Address != 0)
+    Fields["address"] = HexAddress(Location.Address);
+  return Fields;
+}
+
+std::string TCliSession::LocationText(const TGDBLocation& Location) const {
+  const std::string Address = Location.Address != 0 ? HexAddress(Location.Address) : "";
+  if (Location.Source.empty())
+    return Address.empty() ? "an unknown place" : Address;
+  std::string Text = Location.Source;
+  if (Location.Line > 0)
+    Text += ":" + std::to_string(Location.Line);
+  if (!Address.empty())
+    Text += " (" + Address + ")";
+  return Text;
+}
+
+std::string TCliSession::SourceText(const TGDBLocation& Location) {
+  const std::string Line = FSources.Line(Location.Source, Location.Line);
+  if (Line.empty())
+    return {};
+  return std::to_string(Location.Line) + "\t" + Line;
+}
+
+} // namespace midebug::cli

@@ -1,0 +1,139 @@
+#pragma once
+/// \file
+/// One debugging session of the console debugger: the process it debugs,
+/// the commands a person types and the events the library reports.
+
+#include "midebug.h"
+#include "options.h"
+#include "output.h"
+
+#include <chrono>
+#include <cstdint>
+#include <functional>
+#include <set>
+#include <string>
+#include <vector>
+
+namespace midebug::cli {
+
+class TCliSession;
+
+/// The library's listener: hands every event to the session on the main
+/// thread (the two the library raises elsewhere are posted there first).
+class TCliListener : public TInterfaced<IGDBProcessListener> {
+public:
+  explicit TCliListener(TCliSession* Session) : FSession(Session) {}
+  /// Called by the session as it ends; events that come later are dropped.
+  void Forget() { FSession = nullptr; }
+
+  void ProcessSuspended(Integer ThreadId) override;
+  void ProcessResumed(Integer ThreadId) override;
+  void ProcessExited(Integer Code, const std::string& Signal) override;
+  void ThreadCreated(Integer ThreadId) override;
+  void ThreadExited(Integer ThreadId) override;
+  void ModuleLoaded(const TGDBModule& Module) override;
+  void ModuleUnLoaded(const TGDBModule& Module) override;
+  void SignalReceived(bool& ShouldStop, Integer ThreadId, const TGDBException& SignalException) override;
+  void ExceptionRaised(bool& ShouldStop, Integer ThreadId, const TGDBException& LanguageException) override;
+  void LogEvent(const TGDBLogEvent& Event) override;
+  void InternalError(const std::string& Message) override;
+  bool FatalError() override;
+  void ProcessRestart() override;
+
+private:
+  TCliSession* FSession;
+};
+
+/// Where the debugged program is, as the session has learnt from events.
+enum class TRunState : uint8_t { Loaded, Running, Stopped, Exited, Detached, Lost };
+
+class TCliSession {
+public:
+  TCliSession(const TCliOptions& Options, TCliOutput& Output);
+  ~TCliSession();
+  TCliSession(const TCliSession&) = delete;
+  TCliSession& operator=(const TCliSession&) = delete;
+
+  /// Launches or attaches; false, with the reason printed, when that fails.
+  bool Start();
+  /// Runs one command line; false when the session is to end.
+  bool Execute(const std::string& Line);
+  /// Ends the program if it still runs, lets the debugger go and keeps its
+  /// log when asked to.
+  void End();
+
+  // Events, on the main thread.
+  void OnSuspended(Integer ThreadId);
+  void OnResumed(Integer ThreadId);
+  void OnExited(Integer Code, const std::string& Signal);
+  void OnThreadCreated(Integer ThreadId);
+  void OnThreadExited(Integer ThreadId);
+  void OnModule(const TGDBModule& Module, bool Loaded);
+  void OnSignal(Integer ThreadId, const TGDBException& Signal);
+  void OnException(Integer ThreadId, const TGDBException& Exception);
+  void OnLog(const TGDBLogEvent& Event);
+  void OnInternalError(const std::string& Message);
+  void OnDebuggerLost();
+  void OnRestart();
+
+private:
+  using TCommand = void (TCliSession::*)(const std::string& Name, const std::vector<std::string>& Arguments);
+  struct TCommandEntry {
+    const char* Name;
+    TCommand Handler;
+    const char* Usage;
+    const char* Help;
+  };
+  static const std::vector<TCommandEntry>& Commands();
+
+  void CmdRun(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdStart(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdContinue(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdStep(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdPause(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdBacktrace(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdThreads(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdThread(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdFrame(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdKill(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdDetach(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdQuit(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdHelp(const std::string& Name, const std::vector<std::string>& Arguments);
+
+  /// True when the program can be resumed or stepped; otherwise prints why.
+  bool RequireStopped(const std::string& Name);
+  /// The thread commands act on, or null with the reason printed.
+  TIntfPtr<IGDBThread> CurrentThread(const std::string& Name);
+  /// Calls Resume (which starts or resumes the program), then pumps the
+  /// main-thread queue until the program stops, exits or the debugger is
+  /// lost, or the wait limit passes; then answers Name.
+  void ResumeAndWait(const std::string& Name, const std::function<void()>& Resume);
+  /// Pumps until the stop count moves past Before or Limit passes.
+  bool PumpUntilStopAfter(uint64_t Before, std::chrono::milliseconds Limit);
+  /// A location as JSON fields and as "file:line" text.
+  nlohmann::json LocationJson(const TGDBLocation& Location) const;
+  std::string LocationText(const TGDBLocation& Location) const;
+  /// The source text line under Location, indented, or empty.
+  std::string SourceText(const TGDBLocation& Location);
+  void KeepLog();
+
+  const TCliOptions& FOptions;
+  TCliOutput& FOutput;
+  TSourceLines FSources;
+  TIntfPtr<TCliListener> FListener;
+  TIntfPtr<IGDBProcess> FProcess;
+  TRunState FState = TRunState::Loaded;
+  /// Counts stops, exits and the loss of the debugger: the events a command
+  /// that resumes the program waits for.
+  uint64_t FStopCount = 0;
+  Integer FCurrentThread = -1;
+  /// The frame "frame N" selected, 0 being the innermost.
+  Integer FCurrentFrame = 0;
+  std::set<Integer> FThreads;
+  bool FQuit = false;
+  /// The debugger logs present before start-up, so that the new one is found.
+  std::set<std::string> FLogsBefore;
+  std::string FLogDir;
+};
+
+} // namespace midebug::cli
