@@ -443,7 +443,7 @@ TEST(ParserNotify, LibraryLoadedFromGdb13) {
         "\n",
         Process);
   EXPECT_EQ(Process.Calls, TCalls{"ModuleLoaded(libc.so.6)"});
-  EXPECT_EQ(Process.LastModule.Path, R"(\lib\x86_64-linux-gnu\libc.so.6)");
+  EXPECT_EQ(Process.LastModule.Path, "/lib/x86_64-linux-gnu/libc.so.6");
   EXPECT_EQ(Process.LastModule.EntryPoint, 0x7ffff7df8380u);
   EXPECT_EQ(Process.LastModule.BaseAddress, 0x7ffff7df8380u);
   EXPECT_EQ(Process.LastModule.Id, 1);
@@ -541,7 +541,7 @@ TEST(ParserNotify, UnloadedModuleKeepsWhatTheBlockAlreadyRead) {
         Process);
   EXPECT_EQ(Process.Calls, (TCalls{"ModuleLoaded(a.so)", "ModuleUnloaded(b.so)"}));
   EXPECT_EQ(Process.LastModule.Id, 2);
-  EXPECT_EQ(Process.LastModule.Path, "\\lib\\a.so");
+  EXPECT_EQ(Process.LastModule.Path, "/lib/a.so");
   EXPECT_EQ(Process.LastModule.EntryPoint, 0x10u);
 }
 

@@ -73,7 +73,7 @@ std::string_view StripTrailingEscapes(std::string_view Text) {
 
 /// The file-name part of a path: what follows its last backslash or colon.
 std::string_view FileNamePart(std::string_view Path) {
-  const size_t Separator = Path.find_last_of("\\:");
+  const size_t Separator = Path.find_last_of("\\/:");
   return Separator == std::string_view::npos ? Path : Path.substr(Separator + 1);
 }
 
@@ -448,8 +448,12 @@ bool TGDBOutputParser::ProcessNotifyRecord() {
 
 bool TGDBOutputParser::ParseLibraryRecord(bool Loaded) {
   const bool IsWindows = FProcess.IsWindows();
+  // A Linux target's paths stay as they are: turning their "/" into "\"
+  // would name files that do not exist.
+  const bool PosixPaths = FProcess.IsLinux() && !IsWindows;
   FModule.Id = FProcess.GetModuleId(std::string(FScanner.FindValue("id")));
-  const std::string TargetName = ReplaceAll(std::string(FScanner.FindValue("target-name")), "/", "\\");
+  const std::string TargetName = PosixPaths ? std::string(FScanner.FindValue("target-name"))
+                                            : ReplaceAll(std::string(FScanner.FindValue("target-name")), "/", "\\");
   FModule.Name = std::string(FileNamePart(TargetName));
   if (!Loaded)
     return true;
@@ -457,7 +461,9 @@ bool TGDBOutputParser::ParseLibraryRecord(bool Loaded) {
   // The host name still holds the c-string's escapes: a Windows path arrives
   // with doubled backslashes.
   const std::string HostName(FScanner.FindValue("host-name"));
-  FModule.Path = IsWindows ? ReplaceAll(HostName, "\\\\", "\\") : ReplaceAll(HostName, "/", "\\");
+  FModule.Path = IsWindows    ? ReplaceAll(HostName, "\\\\", "\\")
+                 : PosixPaths ? HostName
+                              : ReplaceAll(HostName, "/", "\\");
   if (FScanner.FindValue("symbols-loaded") == "1") {
     FModule.SymPath = FIsLLDB ? std::string(FScanner.FindValue("symbols-path")) : FModule.Path;
     if (IsWindows || FProcess.IsAndroid64())
