@@ -307,12 +307,15 @@ TEST_F(CliTest, CliRunReportsThreadsThatStartAndEndAfterTheStartStop) {
     if (Line.value("event", "") == "thread-exited")
       Exited.insert(Line["thread"].get<int>());
   }
-  // The main thread and the two workers.
-  EXPECT_EQ(Created, (std::set<int>{1, 2, 3})) << Run.Stdout;
+  // The main thread and at least the two workers, whose numbers GDB picks;
+  // every worker that appeared also ended.
+  EXPECT_TRUE(Created.contains(1)) << Run.Stdout;
+  EXPECT_GE(Created.size(), 3u) << Run.Stdout;
   const json* StartAnswer = Run.Answer("start");
   ASSERT_NE(StartAnswer, nullptr);
   EXPECT_EQ((*StartAnswer)["state"], "stopped");
-  EXPECT_TRUE(Exited.contains(2) && Exited.contains(3)) << Run.Stdout;
+  for (const int Thread : Created)
+    EXPECT_TRUE(Thread == 1 || Exited.contains(Thread)) << "thread " << Thread << "\n" << Run.Stdout;
   const json* ExitedEvent = Run.Event("exited");
   ASSERT_NE(ExitedEvent, nullptr) << Run.Stdout;
   EXPECT_EQ((*ExitedEvent)["code"], 6);
