@@ -3,11 +3,34 @@
 /// Running benchmarks and printing the ratio of one to a baseline measured in
 /// the same run.
 
+#include "midebug.h"
+
+#include <atomic>
 #include <string>
 #include <utility>
 #include <vector>
 
 namespace midebug::bench {
+
+/// The IDE side of a benchmark: it counts stops and answers that a silent
+/// debugger is lost; everything else it ignores.
+class TQuietListener : public TInterfaced<IGDBProcessListener> {
+public:
+  std::atomic<int> Stops{0};
+  void ProcessSuspended(Integer) override { ++Stops; }
+  void ProcessResumed(Integer) override {}
+  void ProcessExited(Integer, const std::string&) override {}
+  void ThreadCreated(Integer) override {}
+  void ThreadExited(Integer) override {}
+  void ModuleLoaded(const TGDBModule&) override {}
+  void ModuleUnLoaded(const TGDBModule&) override {}
+  void SignalReceived(bool&, Integer, const TGDBException&) override {}
+  void ExceptionRaised(bool&, Integer, const TGDBException&) override {}
+  void LogEvent(const TGDBLogEvent&) override {}
+  void InternalError(const std::string&) override {}
+  bool FatalError() override { return true; }
+  void ProcessRestart() override {}
+};
 
 /// Runs every registered benchmark (honouring the command-line options), then
 /// prints, for each pair, the first's mean real time per iteration divided by

@@ -13,29 +13,11 @@
 namespace midebug {
 namespace {
 
-/// The IDE side: nothing to do but answer that the debugger is lost.
-class TQuietListener : public TInterfaced<IGDBProcessListener> {
-public:
-  void ProcessSuspended(Integer) override {}
-  void ProcessResumed(Integer) override {}
-  void ProcessExited(Integer, const std::string&) override {}
-  void ThreadCreated(Integer) override {}
-  void ThreadExited(Integer) override {}
-  void ModuleLoaded(const TGDBModule&) override {}
-  void ModuleUnLoaded(const TGDBModule&) override {}
-  void SignalReceived(bool&, Integer, const TGDBException&) override {}
-  void ExceptionRaised(bool&, Integer, const TGDBException&) override {}
-  void LogEvent(const TGDBLogEvent&) override {}
-  void InternalError(const std::string&) override {}
-  bool FatalError() override { return true; }
-  void ProcessRestart() override {}
-};
-
 void BM_SyncRequestVsKernel(benchmark::State& State) {
   SetMainThread();
   TIntfPtr<IGDBProcess> Process;
   try {
-    Process = TGDBProcessManager::CreateProcess(new TQuietListener, "/bin/true", "", "", "local", "Linux64", glC,
+    Process = TGDBProcessManager::CreateProcess(new bench::TQuietListener, "/bin/true", "", "", "local", "Linux64", glC,
                                                 gcAMD64, "gdb");
   } catch (const ENonAIRException& Error) {
     State.SkipWithError(Error.what());

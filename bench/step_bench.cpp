@@ -36,26 +36,8 @@ std::string BuildLoopProgram() {
   return std::system(Command.c_str()) == 0 ? Program : std::string();
 }
 
-class TStepListener : public TInterfaced<IGDBProcessListener> {
-public:
-  std::atomic<int> Stops{0};
-  void ProcessSuspended(Integer) override { ++Stops; }
-  void ProcessResumed(Integer) override {}
-  void ProcessExited(Integer, const std::string&) override {}
-  void ThreadCreated(Integer) override {}
-  void ThreadExited(Integer) override {}
-  void ModuleLoaded(const TGDBModule&) override {}
-  void ModuleUnLoaded(const TGDBModule&) override {}
-  void SignalReceived(bool&, Integer, const TGDBException&) override {}
-  void ExceptionRaised(bool&, Integer, const TGDBException&) override {}
-  void LogEvent(const TGDBLogEvent&) override {}
-  void InternalError(const std::string&) override {}
-  bool FatalError() override { return true; }
-  void ProcessRestart() override {}
-};
-
 /// Pumps the main-thread queue until the listener has seen Count stops.
-bool AwaitStops(const TStepListener& Listener, int Count) {
+bool AwaitStops(const bench::TQuietListener& Listener, int Count) {
   const auto Deadline = std::chrono::steady_clock::now() + std::chrono::seconds(30);
   while (Listener.Stops < Count) {
     if (std::chrono::steady_clock::now() > Deadline)
@@ -121,7 +103,7 @@ private:
 void BM_StepOverVsRawMI(benchmark::State& State) {
   SetMainThread();
   const std::string Program = BuildLoopProgram();
-  TIntfPtr<TStepListener> Listener(new TStepListener);
+  TIntfPtr<bench::TQuietListener> Listener(new bench::TQuietListener);
   TIntfPtr<IGDBProcess> Process;
   TRawGdb Raw;
   try {
