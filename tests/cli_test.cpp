@@ -271,7 +271,9 @@ TEST_F(CliTest, CliRunPauseInterruptsAProgramThatNeverStopsAndKillEndsIt) {
   ASSERT_FALSE(Program.empty());
   // The program never stops by itself, so the run's short wait always ends
   // unanswered; the later --wait wins over the default.
-  const TCliRun Run = RunCli("--wait 2 " + Quote(Program), "run\npause\nkill\n");
+  // The wait also bounds the pause, whose stop takes several requests: leave
+  // room for a loaded machine.
+  const TCliRun Run = RunCli("--wait 6 " + Quote(Program), "run\npause\nkill\n");
   const json* RunAnswer = Run.Answer("run");
   ASSERT_NE(RunAnswer, nullptr) << Run.Stdout;
   EXPECT_NE((*RunAnswer)["error"].get<std::string>().find("did not stop"), std::string::npos);
