@@ -9,6 +9,7 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <cstdlib>
 #include <filesystem>
 #include <fstream>
@@ -46,6 +47,20 @@ public:
     for (const std::string& Call : Calls())
       Count += Call.rfind(Prefix, 0) == 0;
     return Count;
+  }
+};
+
+/// Keeps the modules the IDE heard of, and what GetModule answered for each
+/// while it was being delivered.
+class TModuleListener : public TSignalListener {
+public:
+  TIntfPtr<IGDBProcess> Process;
+  std::vector<TGDBModule> Loaded;
+  std::vector<std::string> CurrentNames;
+  void ModuleLoaded(const TGDBModule& Module) override {
+    TSignalListener::ModuleLoaded(Module);
+    Loaded.push_back(Module);
+    CurrentNames.push_back(Process->GetModule(Module.Id).Name);
   }
 };
 
@@ -165,6 +180,26 @@ int main(int argc, char** argv) {
   if (argc > 1)
     *(volatile int*)0 = 1;
   return handled == SIGUSR1 ? 5 : 6;
+}
+)";
+
+// Loads "libplug.so" from its own directory, calls it and lets it go.
+const char* const PluginHostC = R"(#include <dlfcn.h>
+#include <stdio.h>
+#include <string.h>
+int main(int argc, char** argv) {
+  (void)argc;
+  char path[4096];
+  snprintf(path, sizeof path, "%s", argv[0]);
+  char* slash = strrchr(path, '/');
+  snprintf(slash + 1, sizeof path - (size_t)(slash + 1 - path), "libplug.so");
+  void* plugin = dlopen(path, RTLD_NOW);
+  if (!plugin)
+    return 9;
+  int (*answer)(void) = (int (*)(void))dlsym(plugin, "answer");
+  const int code = answer();
+  dlclose(plugin);
+  return code;
 }
 )";
 
@@ -443,6 +478,84 @@ TEST_F(RunControl, DetachLeavesTheAttachedProgramRunning) {
   EXPECT_TRUE(WIFSIGNALED(Status) && WTERMSIG(Status) == SIGTERM);
 }
 
+TEST_F(RunControl, LoadedAndUnloadedModulesReachTheListenerAndSetTheBaseAddress) {
+  const std::string PluginSource = Scratch.WriteFile("plug.c", "int answer(void) { return 4; }\n");
+  const std::string Build = "gcc -g -shared -fPIC -o '" + Scratch.Path() + "/libplug.so' '" + PluginSource + "'";
+  ASSERT_EQ(std::system(Build.c_str()), 0);
+  TIntfPtr<TModuleListener> Modules(new TModuleListener);
+  Listener = Modules;
+  Launch(Compile(Scratch, "pluginhost", slC, PluginHostC));
+  Modules->Process = Process;
+  ASSERT_TRUE(Process->SetRunToMainBreakpoint());
+  Process->Run();
+  ASSERT_TRUE(NextStop());
+  EXPECT_TRUE(Listener->HasCall("ModuleLoaded(libc.so.6)"));
+  const UInt64 Base = Process->GetBaseAddress();
+  EXPECT_NE(Base, 0u);
+  EXPECT_LE(Base, StopLocation().Address);
+
+  Process->Resume();
+  ASSERT_TRUE(Listener->PumpUntilCall("Exited("));
+  EXPECT_TRUE(Listener->HasCall("Exited(4,"));
+  const std::vector<std::string> Calls = Listener->Calls();
+  const auto Load = std::find(Calls.begin(), Calls.end(), "ModuleLoaded(libplug.so)");
+  ASSERT_NE(Load, Calls.end());
+  EXPECT_NE(std::find(Load, Calls.end(), "ModuleUnLoaded(libplug.so)"), Calls.end());
+  EXPECT_EQ(Process->GetBaseAddress(), Base);
+
+  const auto Plugin = std::find_if(Modules->Loaded.begin(), Modules->Loaded.end(),
+                                   [](const TGDBModule& Module) { return Module.Name == "libplug.so"; });
+  ASSERT_NE(Plugin, Modules->Loaded.end());
+  EXPECT_EQ(Plugin->Path, Scratch.Path() + "/libplug.so");
+  EXPECT_NE(Plugin->BaseAddress, 0u);
+  EXPECT_GT(Plugin->Id, 0);
+  for (size_t Index = 0; Index < Modules->Loaded.size(); ++Index)
+    EXPECT_EQ(Modules->CurrentNames[Index], Modules->Loaded[Index].Name);
+}
+
+TEST_F(RunControl, LaunchThatCannotExecTheProgramEndsWithTheDebuggersReason) {
+  // GDB names the shell's process id before the exec fails, so the launch
+  // ends as an exit with the reason rather than as a missing process id.
+  const std::string Program = Compile(Scratch, "stepping", slC, SteppingC);
+  ASSERT_FALSE(Program.empty());
+  std::filesystem::permissions(Program, std::filesystem::perms::owner_exec | std::filesystem::perms::group_exec |
+                                            std::filesystem::perms::others_exec,
+                               std::filesystem::perm_options::remove);
+  Launch(Program);
+  Process->Run();
+  ASSERT_TRUE(Listener->PumpUntilCall("Exited("));
+  EXPECT_TRUE(Listener->HasCallContaining("During startup program exited with code 126."));
+  EXPECT_FALSE(ProcessOf(Process).Alive());
+  EXPECT_TRUE(ReleaseAndCheckDebuggerGone());
+}
+
+TEST_F(RunControl, DebuggerDyingEndsTheSessionWithoutHanging) {
+  // GDB 13 hits a fatal signal on a variable object of a whole Pascal array.
+  const char* const ArrayPas = "program arr;\nvar a: array[1..3] of integer;\nbegin\n  a[1] := 1;\nend.\n";
+  Launch(Compile(Scratch, "arr", slPascal, ArrayPas), glPascal);
+  ASSERT_TRUE(Process->SetRunToMainBreakpoint());
+  Process->Run();
+  ASSERT_TRUE(NextStop());
+  const Integer Pid = Process->GetPid();
+  TGDBProcess& Core = ProcessOf(Process);
+  std::string Token;
+  TVarCreateResult Variable;
+  const std::string Line = Core.Command().CreateVarCreateCommand(Token, "-", "a", 0);
+  Core.ProcessSyncRequest(Token, Line, Variable);
+  EXPECT_FALSE(Variable.FAvailable && !Variable.FError);
+  ASSERT_TRUE(Listener->PumpUntilCall("Exited("));
+  EXPECT_TRUE(Listener->HasCall("InternalError(Connection to GDB kernel is no longer available"));
+  EXPECT_FALSE(Core.Alive());
+  // Nothing waits for the lost debugger any more.
+  TStackInfoDepthResult Depth;
+  const std::string DepthLine = Core.Command().CreateStackInfoDepthCommand(Token, -1);
+  Core.ProcessSyncRequest(Token, DepthLine, Depth);
+  EXPECT_FALSE(Depth.FAvailable && !Depth.FError);
+  EXPECT_TRUE(ReleaseAndCheckDebuggerGone());
+  // The program does not outlive its debugger.
+  EXPECT_TRUE(Listener->PumpUntil([&] { return !ProcessRuns(Pid); }));
+}
+
 // --- The scripted fake debugger -------------------------------------------------
 
 class RunControlFake : public ::testing::Test {
@@ -508,6 +621,29 @@ TEST_F(RunControlFake, FaultWhileRunningIsAnExitWithMinusOne) {
   ASSERT_TRUE(Listener->PumpUntilCall("Exited("));
   EXPECT_TRUE(Listener->HasCall("Exited(-1,)"));
   EXPECT_FALSE(ProcessOf(Process).Alive());
+}
+
+TEST_F(RunControlFake, WatchpointOutOfScopeResumesWithoutTellingTheIde) {
+  Launch("runcontrol-watch-scope.script");
+  Process->Run();
+  ASSERT_TRUE(Listener->PumpUntilCall("Exited("));
+  EXPECT_TRUE(Listener->HasCall("Exited(4,"));
+  EXPECT_FALSE(Listener->HasCall("Suspended("));
+  EXPECT_FALSE(Listener->HasCall("Resumed("));
+}
+
+TEST_F(RunControlFake, LaunchRefusedBeforeAProcessIdReachesGetPid) {
+  Launch("runcontrol-launch-fails.script");
+  Process->Run();
+  try {
+    Process->GetPid();
+    ADD_FAILURE() << "GetPid answered for a program that never started";
+  } catch (const ENonAIRException& Error) {
+    EXPECT_STREQ(Error.what(), "Unable to create process: 'During startup program exited with code 126.'");
+  }
+  EXPECT_FALSE(ProcessOf(Process).Alive());
+  ProcessPending();
+  EXPECT_FALSE(Listener->HasCall("Exited("));
 }
 
 } // namespace
