@@ -343,6 +343,11 @@ TEST(ParserStops, ReasonsAndTheirNotifications) {
        R"(frame={addr="0x0000555555555281",func="main",args=[{name="argc",value="2"}],file="prog.c",)"
        R"(fullname="/tmp/gt/prog.c",line="18",arch="i386:x86-64"},thread-id="1",stopped-threads="all",core="0")",
        {"Signal(SIGSEGV,Segmentation fault,prog.c:18@0x555555555281,1)"}},
+      // GDB 13: a signal passed on without stopping is announced inside the
+      // record of the stop that follows; that stop is what happened.
+      {R"(*stopped,reason="signal-received",signal-name="SIGUSR1",signal-meaning="User defined signal 1",)"
+       R"(reason="exited",exit-code="05")",
+       {"Exited(5,)"}},
       {R"(*stopped,reason="exception-raised",kind="1",object="0x20",name="EMine",handler="0x40",thread-id="4")",
        {"Exception(EMine,4)"}},
   };

@@ -264,7 +264,14 @@ void TGDBOutputParser::ProcessStopRecord() {
     return;
   }
   FScanner.NextChar();
-  const std::string Reason(FScanner.FindValue("reason"));
+  std::string Reason(FScanner.FindValue("reason"));
+  // GDB writes the announcement of a signal it passed on without stopping
+  // into the record of the next real stop, ahead of that stop's own reason.
+  if (Reason == "signal-received") {
+    const std::string_view Later = FScanner.FindValue("reason");
+    if (!Later.empty())
+      Reason = Later;
+  }
   Integer ThreadId = -1;
 
   if (Reason == "breakpoint-hit") {

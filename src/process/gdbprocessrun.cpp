@@ -249,17 +249,9 @@ void TGDBProcess::SetOsException(const std::string& Signal, bool Stop, bool Pass
     return;
   const bool LLDB = FKernel->IsLLDB();
   std::string Key;
-  std::string Line = BuildCommand(Key, [&](TGDBCommand& Builder, std::string& Echo) {
+  ProcessAsyncRequest(BuildCommand(Key, [&](TGDBCommand& Builder, std::string& Echo) {
     return Builder.CreateCLHandleCommand(Echo, Signal, Stop, Pass, LLDB);
-  });
-  // GDB 13 still announces a signal that does not stop ("print"), and then
-  // writes the announcement's reason and name into the next stop record
-  // ahead of its own: the program's exit would read as a signal stop
-  // without a thread, and the exit would be lost. A signal that is not to
-  // stop is therefore not announced either.
-  if (!LLDB && !Stop)
-    Line += " noprint";
-  ProcessAsyncRequest(Line);
+  }));
 }
 
 } // namespace midebug
