@@ -43,16 +43,12 @@ TEST(PlatformText, IsValidUTF8AcceptsWellFormedAndRejectsMalformedSequences) {
   const TUTF8Case Cases[] = {
       {"empty", "", true},
       {"ASCII with controls", "abc\t\n\x7F", true},
-      {"2-byte e acute", "\xC3\xA9", true},
       {"smallest 2-byte U+0080", "\xC2\x80", true},
-      {"3-byte euro sign", "\xE2\x82\xAC", true},
       {"smallest 3-byte U+0800", "\xE0\xA0\x80", true},
       {"last before surrogates U+D7FF", "\xED\x9F\xBF", true},
       {"first after surrogates U+E000", "\xEE\x80\x80", true},
       {"U+FFFF", "\xEF\xBF\xBF", true},
-      {"4-byte emoji", "\xF0\x9F\x98\x80", true},
       {"largest code point U+10FFFF", "\xF4\x8F\xBF\xBF", true},
-      {"mixed text", "caf\xC3\xA9 \xE2\x82\xAC 5", true},
       {"overlong NUL C0 80", std::string("\xC0\x80", 2), false},
       {"overlong C1 BF", "\xC1\xBF", false},
       {"overlong 3-byte E0 80 80", std::string("\xE0\x80\x80", 3), false},
@@ -64,13 +60,9 @@ TEST(PlatformText, IsValidUTF8AcceptsWellFormedAndRejectsMalformedSequences) {
       {"lead F5", "\xF5\x80\x80\x80", false},
       {"5-byte form", "\xF8\x88\x80\x80\x80", false},
       {"byte FF", "a\xFF", false},
-      {"truncated 2-byte at end", "abc\xC3", false},
-      {"truncated 3-byte at end", "abc\xE2\x82", false},
-      {"truncated 4-byte at end", "abc\xF0\x9F\x98", false},
       {"lead followed by ASCII", "\xC3\x41", false},
       {"3-byte lead with one continuation then ASCII", "\xE2\x82\x41", false},
       {"stray continuation byte", "\x80", false},
-      {"stray continuation inside text", "a\xBF\x62", false},
       {"extra continuation after valid sequence", "\xC3\xA9\xA9", false},
   };
   for (const TUTF8Case& Case : Cases)
@@ -90,15 +82,12 @@ TEST(PlatformText, IsValidUTF8StopsAtTheEndOfAViewCutInsideASequence) {
 
 TEST(PlatformText, AnsiToUTF8ReadsWindows1252) {
   const std::pair<std::string, std::string> Cases[] = {
-      {"plain ASCII", "plain ASCII"},                       // unchanged
       {"\x80", "\xE2\x82\xAC"},                             // euro sign
       {"\x81", "\xC2\x81"},                                 // undefined: the C1 control U+0081
-      {"\x8D", "\xC2\x8D"},                                 // undefined
       {"\x92", "\xE2\x80\x99"},                             // right single quotation mark
       {"\x9F", "\xC5\xB8"},                                 // Y with diaeresis U+0178
       {"\xA0", "\xC2\xA0"},                                 // Latin-1 from here on
       {"\xE9", "\xC3\xA9"},                                 // e acute
-      {"\xFF", "\xC3\xBF"},                                 // y with diaeresis
       {"caf\xE9 \x80\x35", "caf\xC3\xA9 \xE2\x82\xAC\x35"}, // mixed
   };
   for (const auto& [Ansi, Expected] : Cases)
@@ -130,7 +119,6 @@ TEST(PlatformCommandLine, SplitCommandLineHonoursBlanksQuotesAndEscapes) {
   const std::pair<std::string, TStringArray> Cases[] = {
       {"", {}},
       {"   ", {}},
-      {"prog a b", {"prog", "a", "b"}},
       {"  prog  a\t\tb  ", {"prog", "a", "b"}},
       {"\"a b\" c", {"a b", "c"}},
       {"pre\"mid dle\"post", {"premid dlepost"}},
@@ -143,7 +131,6 @@ TEST(PlatformCommandLine, SplitCommandLineHonoursBlanksQuotesAndEscapes) {
       // A backslash before anything else is an ordinary character.
       {"C:\\dir\\file.exe", {"C:\\dir\\file.exe"}},
       {"trailing\\", {"trailing\\"}},
-      {"-c \"echo out; echo err >&2\"", {"-c", "echo out; echo err >&2"}},
   };
   for (const auto& [Line, Words] : Cases)
     EXPECT_EQ(SplitCommandLine(Line), Words) << "command line " << Line;

@@ -2,8 +2,8 @@
 /// Real GDB 13 transcripts (tests/data/transcripts, recorded by record.sh
 /// there) fed to the output parser block by block, as the kernel hands them
 /// over. TranscriptEvents pins down the stops, notifications and streams a
-/// user sees; TranscriptDecoders the result objects of the commands that were
-/// sent, decoded from GDB's real replies.
+/// user sees; TranscriptDecoders the replies in the stream whose shapes the
+/// decoder tests' recorded replies do not already show.
 
 #include "mi/gdboutput.h"
 #include "mi/gdbresult.h"
@@ -184,30 +184,20 @@ TEST(TranscriptEvents, StopsOfBreakpointsStepsFinishAndWatchpointsInOrder) {
   Replay.Replay("stops");
   const auto& Stops = Replay.Process.Suspensions;
 
-  ASSERT_EQ(Stops.size(), 10u);
   // Breakpoint at main, four steps (the last glued behind program output),
-  // the breakpoint in add, finish, one more step.
-  EXPECT_TRUE(IsAt(Stops[0].Location, "stops.c", 34));
-  EXPECT_EQ(Stops[0].Reason, tsrAtBreakpoint);
-  EXPECT_TRUE(IsAt(Stops[1].Location, "stops.c", 35));
-  EXPECT_TRUE(IsAt(Stops[2].Location, "stops.c", 38));
-  EXPECT_TRUE(IsAt(Stops[3].Location, "stops.c", 39));
-  EXPECT_TRUE(IsAt(Stops[4].Location, "stops.c", 40));
-  for (size_t Step = 1; Step <= 4; ++Step)
-    EXPECT_EQ(Stops[Step].Reason, tsrStepDone) << "step " << Step;
-  EXPECT_TRUE(IsAt(Stops[5].Location, "stops.c", 18));
-  EXPECT_EQ(Stops[5].Reason, tsrAtBreakpoint);
-  EXPECT_TRUE(IsAt(Stops[6].Location, "stops.c", 40)) << "function-finished returns to the call";
-  EXPECT_EQ(Stops[6].Reason, tsrStepDone);
-  EXPECT_TRUE(IsAt(Stops[7].Location, "stops.c", 41));
-  EXPECT_EQ(Stops[7].Reason, tsrStepDone);
-  // Two watchpoints firing together are one stop, in bump.
-  EXPECT_TRUE(IsAt(Stops[8].Location, "stops.c", 25));
-  EXPECT_EQ(Stops[8].Reason, tsrAtBreakpoint);
+  // the breakpoint in add, finish back to the call, one more step, two
+  // watchpoints firing together in bump (one stop), the read watchpoint in
+  // probe.
+  const std::pair<Integer, TThreadStopReason> Expected[] = {
+      {34, tsrAtBreakpoint}, {35, tsrStepDone}, {38, tsrStepDone}, {39, tsrStepDone},     {40, tsrStepDone},
+      {18, tsrAtBreakpoint}, {40, tsrStepDone}, {41, tsrStepDone}, {25, tsrAtBreakpoint}, {29, tsrAtBreakpoint},
+  };
+  ASSERT_EQ(Stops.size(), std::size(Expected));
+  for (size_t Index = 0; Index < Stops.size(); ++Index) {
+    EXPECT_TRUE(IsAt(Stops[Index].Location, "stops.c", Expected[Index].first)) << "stop " << Index;
+    EXPECT_EQ(Stops[Index].Reason, Expected[Index].second) << "stop " << Index;
+  }
   EXPECT_EQ(Stops[8].Location.Address, 0x0000555555555186u);
-  // The read watchpoint, in probe.
-  EXPECT_TRUE(IsAt(Stops[9].Location, "stops.c", 29));
-  EXPECT_EQ(Stops[9].Reason, tsrAtBreakpoint);
   for (const TStop& Stop : Stops)
     EXPECT_EQ(Stop.ThreadId, 1);
 
@@ -224,10 +214,7 @@ TEST(TranscriptEvents, ExitCodesReadAsGdbMeansThem) {
     const char* Signal;
   };
   // GDB prints exit codes in octal: "010" is 8, "03" is 3.
-  const TCase Cases[] = {
-      {"stops", 8, ""},     {"records", 3, ""},   {"threads", 0, ""},
-      {"templates", 0, ""}, {"registers", 0, ""}, {"signals", 0, "SIGSEGV"},
-  };
+  const TCase Cases[] = {{"stops", 8, ""}, {"records", 3, ""}, {"threads", 0, ""}, {"signals", 0, "SIGSEGV"}};
   for (const TCase& Case : Cases) {
     TTranscriptReplay Replay;
     Replay.Replay(Case.Transcript);
@@ -356,12 +343,7 @@ TEST(TranscriptEvents, ProgramOutputStartingWithDigitsIsLoggedWhole) {
     const char* Transcript;
     const char* Output;
   };
-  const TCase Cases[] = {
-      {"templates", "42 2.50\n"},
-      {"registers", "5.000000\n"},
-      {"threads", "results 10 20\n"},
-      {"records", "shifting done 5 2\n"},
-  };
+  const TCase Cases[] = {{"templates", "42 2.50\n"}, {"registers", "5.000000\n"}};
   for (const TCase& Case : Cases) {
     TTranscriptReplay Replay;
     Replay.Replay(Case.Transcript);
@@ -427,21 +409,6 @@ TEST(TranscriptEvents, ConsoleCommandsThroughInterpreterExecComplete) {
 // ---------------------------------------------------------------------------
 // Result decoders
 
-TEST(TranscriptDecoders, BreakInsertOnFunctionAndSourceLine) {
-  TTranscriptReplay Replay;
-  auto& OnMain = Replay.Expect<TBreakInsertResult>("0070000000002");
-  auto& OnLine = Replay.Expect<TBreakInsertResult>("0070000000003");
-  Replay.Replay("stops");
-
-  EXPECT_TRUE(IsEntered(OnMain));
-  EXPECT_EQ(OnMain.FBreakpoint, 1);
-  EXPECT_TRUE(IsAt(OnMain.FLocation, "stops.c", 34));
-  EXPECT_EQ(OnMain.FLocation.Address, 0x119fu);
-  EXPECT_TRUE(IsEntered(OnLine));
-  EXPECT_EQ(OnLine.FBreakpoint, 2);
-  EXPECT_TRUE(IsAt(OnLine.FLocation, "stops.c", 18));
-}
-
 TEST(TranscriptDecoders, BreakInsertResolvingToSeveralLocations) {
   TTranscriptReplay Replay;
   auto& Twice = Replay.Expect<TBreakInsertResult>("0070000000002");
@@ -468,76 +435,6 @@ TEST(TranscriptDecoders, BreakWatchForWriteAndReadWatchpoints) {
   // GDB 13 answers a read watchpoint with "hw-rwpt" instead of "wpt".
   EXPECT_TRUE(IsEntered(Sensor));
   EXPECT_EQ(Sensor.FBreakpoint, 5);
-}
-
-TEST(TranscriptDecoders, ThreadInfoOfOneAndOfThreeThreads) {
-  TTranscriptReplay Single;
-  auto& One = Single.Expect<TThreadInfoResult>("0160000000010", false);
-  Single.Replay("stops");
-  TTranscriptReplay Workers;
-  auto& Three = Workers.Expect<TThreadInfoResult>("0160000000004", false);
-  auto& AfterJoin = Workers.Expect<TThreadInfoResult>("0160000000011", true);
-  Workers.Replay("threads");
-
-  EXPECT_TRUE(IsEntered(One));
-  EXPECT_THAT(One.FIds, ElementsAre(1));
-  ASSERT_EQ(One.FNames.size(), 1u);
-  EXPECT_THAT(One.FNames[0], StartsWith("0x7ffff7dcf740 (LWP ")) << "target-id without its first word";
-  ASSERT_EQ(One.FLocations.size(), 1u);
-  EXPECT_TRUE(IsAt(One.FLocations[0], "stops.c", 18));
-  EXPECT_THAT(One.FStates, ElementsAre("stopped"));
-
-  EXPECT_TRUE(IsEntered(Three));
-  EXPECT_THAT(Three.FIds, ElementsAre(1, 2, 3));
-  ASSERT_EQ(Three.FLocations.size(), 3u);
-  EXPECT_TRUE(IsAt(Three.FLocations[0], "futex-internal.c", 57)) << "main waits in pthread_join";
-  EXPECT_TRUE(IsAt(Three.FLocations[1], "threads.c", 14));
-  EXPECT_TRUE(IsAt(Three.FLocations[2], "threads.c", 14));
-  EXPECT_THAT(Three.FStates, ElementsAre("stopped", "stopped", "stopped"));
-
-  EXPECT_TRUE(IsEntered(AfterJoin));
-  EXPECT_THAT(AfterJoin.FIds, ElementsAre(1));
-  EXPECT_THAT(AfterJoin.FStates, ElementsAre("stopped"));
-}
-
-TEST(TranscriptDecoders, ThreadListIdsAndThreadSelect) {
-  TTranscriptReplay Replay;
-  auto& Ids = Replay.Expect<TThreadListIdsResult>("0170000000005");
-  auto& Select = Replay.Expect<TThreadSelectResult>("0180000000006", 1);
-  Replay.Replay("threads");
-
-  EXPECT_TRUE(IsEntered(Ids));
-  EXPECT_THAT(Ids.FIds, ElementsAre(1, 2, 3));
-  EXPECT_TRUE(IsEntered(Select));
-  EXPECT_EQ(Select.FFrameIndex, 0);
-  EXPECT_TRUE(IsAt(Select.FLocation, "futex-internal.c", 57));
-}
-
-TEST(TranscriptDecoders, StackFrameDepthAndFrameList) {
-  TTranscriptReplay Replay;
-  auto& Frame = Replay.Expect<TStackInfoFrameResult>("0290000000011");
-  auto& Depth = Replay.Expect<TStackInfoDepthResult>("0300000000012");
-  auto& Frames = Replay.Expect<TStackListFramesResult>("0320000000013");
-  Replay.Replay("stops");
-  TTranscriptReplay Threads;
-  auto& MainFrames = Threads.Expect<TStackListFramesResult>("0320000000007");
-  Threads.Replay("threads");
-
-  EXPECT_TRUE(IsEntered(Frame));
-  EXPECT_TRUE(IsAt(Frame.FLocation, "stops.c", 18));
-  EXPECT_TRUE(IsEntered(Depth));
-  EXPECT_EQ(Depth.FStackDepth, 2);
-  EXPECT_TRUE(IsEntered(Frames));
-  ASSERT_EQ(Frames.FStackFrames.size(), 2u);
-  EXPECT_EQ(Frames.FStackFrames[0].Header, "add");
-  EXPECT_TRUE(IsAt(Frames.FStackFrames[0].Location, "stops.c", 18));
-  EXPECT_EQ(Frames.FStackFrames[1].Header, "main");
-  EXPECT_TRUE(IsAt(Frames.FStackFrames[1].Location, "stops.c", 40));
-  EXPECT_EQ(Frames.FStackFrames[1].Location.Address, 0x000055555555520du);
-  EXPECT_TRUE(IsEntered(MainFrames));
-  ASSERT_EQ(MainFrames.FStackFrames.size(), 5u);
-  EXPECT_EQ(MainFrames.FStackFrames[3].Header, "__pthread_clockjoin_ex");
-  EXPECT_TRUE(IsAt(MainFrames.FStackFrames[4].Location, "threads.c", 26));
 }
 
 TEST(TranscriptDecoders, StackFramesThroughLibrariesAndOtherLanguages) {
@@ -569,27 +466,11 @@ TEST(TranscriptDecoders, StackFramesThroughLibrariesAndOtherLanguages) {
   }
 }
 
-TEST(TranscriptDecoders, StackArgumentsAndLocals) {
-  TTranscriptReplay Replay;
-  auto& Arguments = Replay.Expect<TStackListArgumentsResult>("0310000000014");
-  auto& Locals = Replay.Expect<TStackListLocalsResult>("0330000000015");
-  Replay.Replay("stops");
+TEST(TranscriptDecoders, PascalRecordArgumentAndNoLocals) {
   TTranscriptReplay Pascal;
   auto& PascalArguments = Pascal.Expect<TStackListArgumentsResult>("0310000000005");
   auto& NoLocals = Pascal.Expect<TStackListLocalsResult>("0330000000009");
   Pascal.Replay("records");
-
-  EXPECT_TRUE(IsEntered(Arguments));
-  ASSERT_EQ(Arguments.FStackArguments.size(), 2u);
-  const TNameValueArray& AddArguments = Arguments.FStackArguments[0].NameValues;
-  ASSERT_EQ(AddArguments.size(), 2u);
-  EXPECT_EQ(AddArguments[0].Name, "left");
-  EXPECT_EQ(AddArguments[0].Value, "3");
-  EXPECT_EQ(AddArguments[1].Name, "right");
-  EXPECT_EQ(AddArguments[1].Value, "4");
-  EXPECT_TRUE(Arguments.FStackArguments[1].NameValues.empty());
-  EXPECT_TRUE(IsEntered(Locals));
-  EXPECT_THAT(Locals.FStackLocals, ElementsAre("sum"));
 
   EXPECT_TRUE(IsEntered(PascalArguments));
   ASSERT_FALSE(PascalArguments.FStackArguments.empty());
@@ -602,32 +483,13 @@ TEST(TranscriptDecoders, StackArgumentsAndLocals) {
   EXPECT_TRUE(NoLocals.FStackLocals.empty());
 }
 
-TEST(TranscriptDecoders, VariableObjectsOfStructAndArray) {
+TEST(TranscriptDecoders, VariableObjectsOfArrayAndQuotedString) {
   TTranscriptReplay Replay;
-  auto& Origin = Replay.Expect<TVarCreateResult>("0350000000018");
-  auto& OriginChildren = Replay.Expect<TVarListChildrenResult>("0400000000019");
   auto& Squares = Replay.Expect<TVarCreateResult>("0350000000020");
   auto& SquareChildren = Replay.Expect<TVarListChildrenResult>("0400000000021");
   auto& Count = Replay.Expect<TVarInfoNumChildrenResult>("0390000000022");
   auto& Name = Replay.Expect<TVarEvaluateExpressionResult>("0450000000023");
-  auto& Update = Replay.Expect<TVarUpdateResult>("0470000000035");
   Replay.Replay("stops");
-
-  EXPECT_TRUE(IsEntered(Origin));
-  EXPECT_EQ(Origin.FName, "origin_var");
-  EXPECT_EQ(Origin.FNumChild, 3);
-  EXPECT_EQ(Origin.FType, "struct point");
-  EXPECT_EQ(Origin.FValue, "{...}");
-  EXPECT_TRUE(Origin.FValueDefined);
-
-  EXPECT_TRUE(IsEntered(OriginChildren));
-  ASSERT_EQ(OriginChildren.FChildren.size(), 3u);
-  EXPECT_EQ(OriginChildren.FChildren[0].Name, "origin_var.x");
-  EXPECT_EQ(OriginChildren.FChildren[0].Expr, "x");
-  EXPECT_EQ(OriginChildren.FChildren[0].VarType, "int");
-  EXPECT_EQ(OriginChildren.FChildren[2].Expr, "name");
-  EXPECT_EQ(OriginChildren.FChildren[2].NumChild, 1);
-  EXPECT_EQ(OriginChildren.FChildren[2].VarType, "const char *");
 
   EXPECT_TRUE(IsEntered(Squares));
   EXPECT_EQ(Squares.FNumChild, 5);
@@ -641,12 +503,6 @@ TEST(TranscriptDecoders, VariableObjectsOfStructAndArray) {
   EXPECT_EQ(Count.FCount, 5);
   EXPECT_TRUE(IsEntered(Name));
   EXPECT_EQ(Name.FValue, "0x555555556004 \"origin\"");
-
-  EXPECT_TRUE(IsEntered(Update));
-  ASSERT_EQ(Update.FChangeList.size(), 1u);
-  EXPECT_EQ(Update.FChangeList[0].Name, "counter_var");
-  EXPECT_EQ(Update.FChangeList[0].Value, "1");
-  EXPECT_FALSE(Update.FOutOfScope);
 }
 
 TEST(TranscriptDecoders, VariableObjectsOfClassAndPascalRecord) {
@@ -689,35 +545,11 @@ TEST(TranscriptDecoders, VariableObjectsOfClassAndPascalRecord) {
   EXPECT_EQ(Element.FValue, "20");
 }
 
-TEST(TranscriptDecoders, MemoryReadInBothForms) {
+TEST(TranscriptDecoders, DisassemblyOverTwoSourceLinesAndLineAddresses) {
   TTranscriptReplay Replay;
-  auto& Bytes = Replay.Expect<TDataReadMemoryResult>("0600000000025", true);
-  auto& Words = Replay.Expect<TDataReadMemoryResult>("0590000000026", false);
-  auto& Total = Replay.Expect<TDataEvaluateExpressionResult>("0500000000024");
-  Replay.Replay("stops");
-
-  const std::vector<Byte> Pattern = {0xde, 0xad, 0xbe, 0xef, 0x01, 0x02, 0x03, 0x04};
-  EXPECT_TRUE(IsEntered(Bytes));
-  EXPECT_EQ(Bytes.FData, Pattern);
-  EXPECT_TRUE(IsEntered(Words));
-  EXPECT_EQ(Words.FData, Pattern);
-  EXPECT_TRUE(IsEntered(Total));
-  EXPECT_EQ(Total.FValue, "7");
-}
-
-TEST(TranscriptDecoders, DisassemblyPlainAndWithSource) {
-  TTranscriptReplay Replay;
-  auto& Plain = Replay.Expect<TDataDisassembleResult>("0490000000027", false);
   auto& Mixed = Replay.Expect<TDataDisassembleResult>("0490000000028", true);
   auto& Lines = Replay.Expect<TSymbolListLinesResult>("0680000000029", true);
   Replay.Replay("stops");
-
-  EXPECT_TRUE(IsEntered(Plain));
-  ASSERT_EQ(Plain.FData.size(), 3u);
-  EXPECT_EQ(Plain.FData[0].Address, 0x0000555555555210u);
-  EXPECT_EQ(Plain.FData[0].AsmData, "mov    -0x4(%rbp),%eax");
-  EXPECT_EQ(Plain.FData[2].Address, 0x0000555555555215u);
-  EXPECT_EQ(Plain.FData[0].Line, 0);
 
   // Only the first instruction of a source line carries the line.
   EXPECT_TRUE(IsEntered(Mixed));
@@ -742,17 +574,13 @@ TEST(TranscriptDecoders, RegisterNamesMapToGdbNumbers) {
   Replay.Replay("registers");
 
   EXPECT_TRUE(IsEntered(Names));
-  ASSERT_GT(Names.FNames.size(), 57u);
-  EXPECT_EQ(Names.FNames[0], "rax");
-  EXPECT_EQ(Names.FNames[17], "eflags");
-  EXPECT_EQ(Names.FNames[24], "st0");
-  EXPECT_EQ(Names.FNames[40], "xmm0");
   const TIntegerArray Ids = Names.GetRegisterIds();
   ASSERT_EQ(Ids.size(), 24u);
   EXPECT_EQ(Ids[1], 1) << "rbx";
   EXPECT_EQ(Ids[6], 8) << "r8";
   EXPECT_EQ(Ids[14], 6) << "rbp";
   EXPECT_EQ(Ids[16], 16) << "rip";
+  EXPECT_EQ(Ids[17], 17) << "our rflags is GDB's eflags";
   const TIntegerArray FPUIds = Names.GetFPURegisterIds();
   ASSERT_EQ(FPUIds.size(), 16u);
   EXPECT_EQ(FPUIds[0], 24);
@@ -761,25 +589,6 @@ TEST(TranscriptDecoders, RegisterNamesMapToGdbNumbers) {
   ASSERT_EQ(XMMIds.size(), 17u);
   EXPECT_EQ(XMMIds[1], 41);
   EXPECT_EQ(XMMIds[16], 56) << "mxcsr";
-}
-
-TEST(TranscriptDecoders, GeneralRegisterValues) {
-  TIntegerArray General;
-  for (Integer Id = 0; Id <= 17; ++Id)
-    General.push_back(Id);
-  TTranscriptReplay Replay;
-  auto& All = Replay.Expect<TDataListRegisterValuesResult>("0530000000005", General);
-  auto& Flags = Replay.Expect<TDataListRegisterValuesResult>("0530000000006", 17, false);
-  Replay.Replay("registers");
-
-  EXPECT_TRUE(IsEntered(All));
-  ASSERT_EQ(All.FValues.size(), 18u);
-  EXPECT_EQ(All.FValues[0], 0x55667788u);
-  EXPECT_EQ(All.FValues[3], 0x11223344u);
-  EXPECT_EQ(All.FValues[16], 0x5555555551b8u) << "rip";
-  EXPECT_EQ(All.FValues[17], 0x206u);
-  EXPECT_TRUE(IsEntered(Flags));
-  EXPECT_EQ(Flags.FValue, 0x206u);
 }
 
 TEST(TranscriptDecoders, X87RegistersHoldTheir80BitValue) {
