@@ -243,8 +243,8 @@ const std::vector<TLineCase> TargetCases = {
     {"AttachToPidCLIHasNoToken", BUILD(CreateTargetAttachCommand(T, 123, true)), ctUnknown,
      "process attach --pid 123", kUntouched},
     {"AttachToName", BUILD(CreateTargetAttachCommand(T, "prog")), ctTargetAttach, "-target-attach prog"},
-    {"InterpreterExec", BUILD(CreateInterpreterExecCommand(T, ctCLKill)), ctInterpreterExec,
-     "-interpreter-exec console kill"},
+    {"InterpreterExecQuotesTheCommand", BUILD(CreateInterpreterExecCommand(T, ctCLInfoLineAddress)),
+     ctInterpreterExec, "-interpreter-exec console \"info line\""},
 };
 INSTANTIATE_TEST_SUITE_P(CommandBuilderTarget, CommandLine, testing::ValuesIn(TargetCases), CaseName);
 

@@ -799,7 +799,8 @@ std::string TGDBCommand::CreateEnableDebugHookCommand(std::string& Token, const 
 }
 
 std::string TGDBCommand::CreateInterpreterExecCommand(std::string& Token, TMiCommand Command) {
-  return MiLine(Token, ctInterpreterExec, " console " + CreateCLCommand(Command));
+  // Unquoted, GDB would run each word of "info line" as a command of its own.
+  return MiLine(Token, ctInterpreterExec, " console " + QuoteCString(CreateCLCommand(Command)));
 }
 
 // CLI commands answered through GDB's echo of the line
