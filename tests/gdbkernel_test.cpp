@@ -155,11 +155,22 @@ TEST_F(FakeDebuggerTest, MarkerInASecondReadEndsTheReply) {
   EXPECT_EQ(Reply, "0980000000003^done\n");
 }
 
-TEST_F(FakeDebuggerTest, PromptInsideTheDataIsNotAnEnd) {
-  auto Kernel = StartFake("sendraw 1^done\\n(gdb) \\n=thread-created,id=\"1\"\\n\nsleep 20\nprompt\nwait-eof\n");
+TEST_F(FakeDebuggerTest, PromptInsideOneReadEndsABlockAndTheRestStartsTheNext) {
+  // GDB prints the next library record right after the prompt that follows
+  // "*running"; nothing more may come while the program runs, so the block
+  // before the prompt must not wait for it.
+  auto Kernel = StartFake("sendraw 1^done\\n(gdb) \\n=thread-created,id=\"1\"\\n(gdb) \\n=library-loaded\\n\n"
+                          "sendraw (gd\nsleep 50\nsendraw b) \\n2^done\\n(gdb) \\n\nhang\n");
   std::string Reply;
   ASSERT_TRUE(Kernel->GetReply(Reply));
-  EXPECT_EQ(Reply, "1^done\n(gdb) \n=thread-created,id=\"1\"\n");
+  EXPECT_EQ(Reply, "1^done\n");
+  ASSERT_TRUE(Kernel->GetReply(Reply));
+  EXPECT_EQ(Reply, "=thread-created,id=\"1\"\n");
+  // A prompt split between two reads.
+  ASSERT_TRUE(Kernel->GetReply(Reply));
+  EXPECT_EQ(Reply, "=library-loaded\n");
+  ASSERT_TRUE(Kernel->GetReply(Reply));
+  EXPECT_EQ(Reply, "2^done\n");
 }
 
 TEST_F(FakeDebuggerTest, BytesThatAreNotUtf8AreReadAsWindows1252) {

@@ -153,6 +153,7 @@ bool TGDBKernel::Start() {
     FStdOutHandle = FStdOutPipe->ReadHandle();
     FProcessHandle = Child.Pid;
     FBuffer.assign(ReplyBufferStep, 0);
+    FHeldBytes = 0;
     FRunning = true;
     OpenLogFile();
     return true;
@@ -263,13 +264,40 @@ Int64 TGDBKernel::Read(char* Buffer, size_t Count) {
   return BytesRead > 0 ? BytesRead : -1;
 }
 
+namespace {
+
+/// The offset just past the first prompt in the Count bytes at Data that
+/// ends at or after From, or 0 when there is none.
+size_t FindPromptEnd(const char* Data, size_t Count, size_t From, std::string_view Marker) {
+  const std::string_view Bytes(Data, Count);
+  const size_t Start = From >= Marker.size() ? From - Marker.size() + 1 : 0;
+  const size_t Found = Bytes.find(Marker, Start);
+  return Found == std::string_view::npos ? 0 : Found + Marker.size();
+}
+
+} // namespace
+
 bool TGDBKernel::GetReply(std::string& Reply) {
   Reply.clear();
   FReplyBusy = true;
-  FLastBytesRead = 0;
+  // Bytes that came after the previous block's prompt in the same read
+  // start this block. The prompt is looked for wherever it lands: GDB goes
+  // on printing (a library loaded while the program starts) right after it,
+  // and waiting for data that ends with it could wait for ever.
+  FLastBytesRead = FHeldBytes;
+  FHeldBytes = 0;
+  size_t Searched = 0;
   bool Result = true;
   const std::string& Marker = FGDBEndOfLineMarker;
   for (;;) {
+    if (const size_t End = FindPromptEnd(FBuffer.data(), FLastBytesRead, Searched, Marker)) {
+      Reply = DecodeUTF8OrAnsi(std::string_view(FBuffer.data(), End - Marker.size()));
+      Log({}, true);
+      FHeldBytes = FLastBytesRead - End;
+      std::memmove(FBuffer.data(), FBuffer.data() + End, FHeldBytes);
+      break;
+    }
+    Searched = FLastBytesRead;
     if (FBuffer.size() <= FLastBytesRead)
       FBuffer.resize(FLastBytesRead + ReplyBufferStep);
     const Int64 BytesRead = Read(FBuffer.data() + FLastBytesRead, FBuffer.size() - FLastBytesRead);
@@ -294,19 +322,14 @@ bool TGDBKernel::GetReply(std::string& Reply) {
     }
     if (FLogFile)
       FLogFile->Write(std::string_view(FBuffer.data() + FLastBytesRead, static_cast<size_t>(BytesRead)));
-    const size_t Total = FLastBytesRead + static_cast<size_t>(BytesRead);
-    if (Total >= Marker.size() && std::memcmp(FBuffer.data() + Total - Marker.size(), Marker.data(), Marker.size()) == 0) {
-      Reply = DecodeUTF8OrAnsi(std::string_view(FBuffer.data(), Total - Marker.size()));
-      Log({}, true);
-      break;
-    }
-    if (Total == FBuffer.size())
+    FLastBytesRead += static_cast<size_t>(BytesRead);
+    if (FLastBytesRead == FBuffer.size())
       FBuffer.resize(FBuffer.size() + ReplyBufferStep);
-    FLastBytesRead = Total;
   }
-  if (FBuffer.size() > ReplyBufferShrinkAbove) {
-    FBuffer.assign(ReplyBufferStep, 0);
-    FBuffer.shrink_to_fit();
+  if (FBuffer.size() > ReplyBufferShrinkAbove && FHeldBytes <= ReplyBufferStep) {
+    std::vector<char> Smaller(ReplyBufferStep, 0);
+    std::memcpy(Smaller.data(), FBuffer.data(), FHeldBytes);
+    FBuffer.swap(Smaller);
   }
   FReplyBusy = false;
   return Result;

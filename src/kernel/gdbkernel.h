@@ -168,6 +168,8 @@ private:
   THandle FStdInHandle = InvalidHandle;
   std::vector<char> FBuffer;
   size_t FLastBytesRead = 0;
+  /// Bytes read after the last reply's prompt, kept at the front of FBuffer.
+  size_t FHeldBytes = 0;
   std::unique_ptr<TLogWriter> FLogFile;
   std::string FCommandFile;
   std::string FGDBEndOfLineMarker;
