@@ -54,7 +54,8 @@ public:
 /// while it was being delivered.
 class TModuleListener : public TSignalListener {
 public:
-  TIntfPtr<IGDBProcess> Process;
+  /// Not owned: the process owns its listener.
+  IGDBProcess* Process = nullptr;
   std::vector<TGDBModule> Loaded;
   std::vector<std::string> CurrentNames;
   void ModuleLoaded(const TGDBModule& Module) override {
@@ -485,7 +486,7 @@ TEST_F(RunControl, LoadedAndUnloadedModulesReachTheListenerAndSetTheBaseAddress)
   TIntfPtr<TModuleListener> Modules(new TModuleListener);
   Listener = Modules;
   Launch(Compile(Scratch, "pluginhost", slC, PluginHostC));
-  Modules->Process = Process;
+  Modules->Process = Process.get();
   ASSERT_TRUE(Process->SetRunToMainBreakpoint());
   Process->Run();
   ASSERT_TRUE(NextStop());
