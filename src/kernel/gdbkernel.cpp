@@ -266,8 +266,8 @@ Int64 TGDBKernel::Read(char* Buffer, size_t Count) {
 
 namespace {
 
-/// The offset just past the first prompt in the Count bytes at Data that
-/// ends at or after From, or 0 when there is none.
+/// The offset just past the first prompt in the Count bytes at Data whose
+/// last byte lies at or after offset From, or 0 when there is none.
 size_t FindPromptEnd(const char* Data, size_t Count, size_t From, std::string_view Marker) {
   const std::string_view Bytes(Data, Count);
   const size_t Start = From >= Marker.size() ? From - Marker.size() + 1 : 0;
