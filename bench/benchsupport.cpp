@@ -49,4 +49,29 @@ int RunAndPrintRatios(int argc, char** argv, const std::vector<std::pair<std::st
   return 0;
 }
 
+TRawGdbPipes::~TRawGdbPipes() {
+  if (FPid == -1)
+    return;
+  KillProcess(FPid);
+  ReapChildProcess(FPid);
+}
+
+bool TRawGdbPipes::Start() {
+  TChildProcess Child;
+  std::string Error;
+  if (!StartChildProcess(SplitCommandLine("gdb --nw --nx  --interpreter=mi2"), {}, FStdIn.ReadHandle(),
+                         FStdOut.WriteHandle(), Child, Error))
+    return false;
+  FPid = Child.Pid;
+  FStdIn.CloseRead();
+  FStdOut.CloseWrite();
+  return true;
+}
+
+bool TRawGdbPipes::Write(const std::string& Line) {
+  return WriteHandle(FStdIn.WriteHandle(), Line.data(), Line.size()) == static_cast<Int64>(Line.size());
+}
+
+Int64 TRawGdbPipes::Read(char* Buffer, size_t Count) { return ReadHandle(FStdOut.ReadHandle(), Buffer, Count); }
+
 } // namespace midebug::bench

@@ -32,6 +32,27 @@ public:
   void ProcessRestart() override {}
 };
 
+/// GDB in MI mode on two plain pipes, the baseline a benchmark compares the
+/// library with. Killed and reaped on destruction.
+class TRawGdbPipes {
+public:
+  TRawGdbPipes() = default;
+  TRawGdbPipes(const TRawGdbPipes&) = delete;
+  TRawGdbPipes& operator=(const TRawGdbPipes&) = delete;
+  ~TRawGdbPipes();
+
+  bool Start();
+  /// Writes the whole of Line.
+  bool Write(const std::string& Line);
+  /// One blocking read into Buffer; the count read, 0 or less at the end.
+  Int64 Read(char* Buffer, size_t Count);
+
+private:
+  TPipe FStdIn;
+  TPipe FStdOut;
+  Integer FPid = -1;
+};
+
 /// Runs every registered benchmark (honouring the command-line options), then
 /// prints, for each pair, the first's mean real time per iteration divided by
 /// the second's. Returns the process exit code.

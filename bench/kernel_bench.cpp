@@ -37,43 +37,20 @@ BENCHMARK(BM_KernelRoundTrip)->UseRealTime()->MinTime(2.0);
 
 /// GDB on two pipes, read with plain blocking reads until the prompt ends the
 /// bytes read so far.
-class TRawGdb {
+class TRawGdb : public bench::TRawGdbPipes {
 public:
-  bool Start() {
-    TChildProcess Child;
-    std::string Error;
-    if (!StartChildProcess(SplitCommandLine("gdb --nw --nx  --interpreter=mi2"), {}, FStdIn.ReadHandle(),
-                           FStdOut.WriteHandle(), Child, Error))
-      return false;
-    FPid = Child.Pid;
-    FStdIn.CloseRead();
-    FStdOut.CloseWrite();
-    return true;
-  }
-  ~TRawGdb() {
-    KillProcess(FPid);
-    ReapChildProcess(FPid);
-  }
-  bool Write(const std::string& Line) {
-    return WriteHandle(FStdIn.WriteHandle(), Line.data(), Line.size()) == static_cast<Int64>(Line.size());
-  }
   bool ReadBlock(std::string& Block) {
     static const std::string Prompt = "(gdb) \n";
     Block.clear();
     char Buffer[4096];
     while (!Block.ends_with(Prompt)) {
-      const Int64 Read = ReadHandle(FStdOut.ReadHandle(), Buffer, sizeof Buffer);
-      if (Read <= 0)
+      const Int64 BytesRead = Read(Buffer, sizeof Buffer);
+      if (BytesRead <= 0)
         return false;
-      Block.append(Buffer, static_cast<size_t>(Read));
+      Block.append(Buffer, static_cast<size_t>(BytesRead));
     }
     return true;
   }
-
-private:
-  TPipe FStdIn;
-  TPipe FStdOut;
-  Integer FPid = -1;
 };
 
 void BM_RawRoundTrip(benchmark::State& State) {

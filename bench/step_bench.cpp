@@ -48,32 +48,18 @@ bool AwaitStops(const bench::TQuietListener& Listener, int Count) {
 }
 
 /// GDB on two pipes, answered line by line with blocking reads.
-class TRawGdb {
+class TRawGdb : public bench::TRawGdbPipes {
 public:
   bool Start(const std::string& Program) {
-    TChildProcess Child;
-    std::string Error;
-    if (!StartChildProcess(SplitCommandLine("gdb --nw --nx  --interpreter=mi2"), {}, FStdIn.ReadHandle(),
-                           FStdOut.WriteHandle(), Child, Error))
-      return false;
-    FPid = Child.Pid;
-    FStdIn.CloseRead();
-    FStdOut.CloseWrite();
-    return Await("(gdb) \n") && Request("-file-exec-and-symbols \"" + Program + "\"") &&
-           Request("-break-insert -f main") && Request("-exec-run", "*stopped");
-  }
-  ~TRawGdb() {
-    KillProcess(FPid);
-    ReapChildProcess(FPid);
+    return TRawGdbPipes::Start() && Await("(gdb) \n") &&
+           Request("-file-exec-and-symbols \"" + Program + "\"") && Request("-break-insert -f main") &&
+           Request("-exec-run", "*stopped");
   }
   /// Sends Command under a fresh token and reads until its result record
   /// and, when given, Also.
   bool Request(const std::string& Command, const std::string& Also = {}) {
     const std::string Token = std::to_string(++FToken);
-    const std::string Line = Token + Command + "\n";
-    if (WriteHandle(FStdIn.WriteHandle(), Line.data(), Line.size()) != static_cast<Int64>(Line.size()))
-      return false;
-    return Await("\n" + Token + "^") && (Also.empty() || Await(Also));
+    return Write(Token + Command + "\n") && Await("\n" + Token + "^") && (Also.empty() || Await(Also));
   }
 
 private:
@@ -86,16 +72,13 @@ private:
         FPending.replace(0, Found + Text.size(), "\n");
         return true;
       }
-      const Int64 Read = ReadHandle(FStdOut.ReadHandle(), Buffer, sizeof Buffer);
-      if (Read <= 0)
+      const Int64 BytesRead = Read(Buffer, sizeof Buffer);
+      if (BytesRead <= 0)
         return false;
-      FPending.append(Buffer, static_cast<size_t>(Read));
+      FPending.append(Buffer, static_cast<size_t>(BytesRead));
     }
   }
 
-  TPipe FStdIn;
-  TPipe FStdOut;
-  Integer FPid = -1;
   Cardinal FToken = 0;
   std::string FPending = "\n";
 };
