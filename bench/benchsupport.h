@@ -4,6 +4,7 @@
 /// the same run.
 
 #include "midebug.h"
+#include "platform/hostprocess.h"
 
 #include <atomic>
 #include <string>

@@ -2,6 +2,7 @@
 // real GDB, beside a minimal loop doing the same with blocking pipe I/O.
 
 #include "benchsupport.h"
+#include "kernel/gdbkernel.h"
 #include "midebug.h"
 
 #include <benchmark/benchmark.h>

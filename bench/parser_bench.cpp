@@ -2,6 +2,7 @@
 // the same bytes for line ends.
 
 #include "benchsupport.h"
+#include "mi/gdboutput.h"
 #include "midebug.h"
 #include "nullprocess.h"
 

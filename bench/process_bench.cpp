@@ -3,7 +3,9 @@
 // the kernel's own round trip with the same GDB command, interleaved.
 
 #include "benchsupport.h"
+#include "kernel/gdbkernel.h"
 #include "midebug.h"
+#include "process/gdbprocess.h"
 
 #include <benchmark/benchmark.h>
 

@@ -1,26 +1,11 @@
 #pragma once
 /// \file
-/// The public face of the midebug library: code outside it includes only this.
+/// The boundary an IDE includes: the process manager that creates and
+/// attaches debugged processes, the interfaces and records they are driven
+/// through, the IDE's service registry (remote profiles), and the delivery
+/// of events on the IDE's main thread.
 
-#include "inspect/gdbthread.h"
-#include "kernel/gdbkernel.h"
-#include "kernel/gdblogevent.h"
-#include "kernel/gdbremotekernel.h"
-#include "kernel/lldbkernel.h"
-#include "kernel/localagent.h"
-#include "kernel/raclient.h"
-#include "mi/gdbcommand.h"
-#include "mi/gdboutput.h"
-#include "mi/gdbresult.h"
-#include "platform/hostfiles.h"
-#include "platform/hostprocess.h"
-#include "platform/hostthread.h"
+#include "kernel/ideservices.h"
 #include "platform/mainthread.h"
-#include "platform/textencoding.h"
-#include "platform/types.h"
 #include "process/gdbinterfaces.h"
-#include "process/gdbprocess.h"
 #include "process/gdbprocessmanager.h"
-#include "process/ideservices.h"
-#include "process/liveprocesses.h"
-#include "process/lldbprocess.h"

@@ -1,6 +1,10 @@
 // The local debugger transport against the real GDB and the scripted fake.
 
+#include "kernel/gdbkernel.h"
+#include "kernel/lldbkernel.h"
 #include "midebug.h"
+#include "platform/hostfiles.h"
+#include "platform/hostthread.h"
 #include "testsupport.h"
 
 #include <gtest/gtest.h>

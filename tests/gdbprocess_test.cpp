@@ -3,6 +3,10 @@
 // policy, and a debugger that goes away.
 
 #include "midebug.h"
+#include "platform/hostfiles.h"
+#include "platform/hostprocess.h"
+#include "process/gdbprocess.h"
+#include "process/lldbprocess.h"
 #include "testlistener.h"
 #include "testsupport.h"
 

@@ -1,7 +1,11 @@
 // The in-process agent: debuggers started on this machine through the
 // "local" profile, the real GDB and lldb-mi played by the scripted fake.
 
+#include "kernel/gdbkernel.h"
+#include "kernel/gdbremotekernel.h"
+#include "kernel/localagent.h"
 #include "midebug.h"
+#include "platform/hostfiles.h"
 #include "testsupport.h"
 
 #include <gtest/gtest.h>

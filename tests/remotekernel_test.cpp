@@ -1,6 +1,9 @@
 // The remote kernel against a scripted agent channel reached through a test
 // profile on the IDE's service registry.
 
+#include "kernel/gdbkernel.h"
+#include "kernel/gdbremotekernel.h"
+#include "kernel/raclient.h"
 #include "midebug.h"
 
 #include <gtest/gtest.h>

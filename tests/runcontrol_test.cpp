@@ -4,6 +4,8 @@
 // cannot be made to do.
 
 #include "midebug.h"
+#include "platform/hostfiles.h"
+#include "process/gdbprocess.h"
 #include "testlistener.h"
 #include "testsupport.h"
 

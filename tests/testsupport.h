@@ -3,6 +3,7 @@
 /// Helpers shared by the tests: locating the fake debugger and test data,
 /// scratch directories, and compiling small programs to debug.
 
+#include "kernel/gdbkernel.h"
 #include "midebug.h"
 
 #include <string>

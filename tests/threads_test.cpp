@@ -2,7 +2,9 @@
 // C, C++ and Pascal programs stopped in nested functions, their call-stack
 // header lines, frame locations, and thread and frame selection.
 
+#include "inspect/gdbthread.h"
 #include "midebug.h"
+#include "process/gdbprocess.h"
 #include "testlistener.h"
 #include "testsupport.h"
 

@@ -20,13 +20,6 @@
 
 namespace midebug {
 
-/// Raised only where a process cannot be started, created, attached or given
-/// a process id; it reaches the IDE through the process manager.
-class ENonAIRException : public std::runtime_error {
-public:
-  using std::runtime_error::runtime_error;
-};
-
 /// A point in time for the reply time-out; the default value means "not
 /// started yet".
 using TDateTime = std::chrono::steady_clock::time_point;

@@ -1,7 +1,7 @@
 #include "kernel/gdbremotekernel.h"
 
 #include "platform/hostthread.h"
-#include "process/ideservices.h"
+#include "kernel/ideservices.h"
 
 namespace midebug {
 

@@ -7,7 +7,7 @@
 #include "mi/gdbresult.h"
 #include "mi/miscanner.h"
 #include "platform/types.h"
-#include "process/gdbinterfaces.h"
+#include "mi/gdbinternalprocess.h"
 
 #include <string>
 #include <string_view>

@@ -1,259 +1,30 @@
 #pragma once
 /// \file
-/// The interfaces that cross the library's boundary and the one through
-/// which the output parser drives a process, with the reference counting
-/// they share. Operations are declared in method-table order: after the
-/// three reference-counting operations of IInterface, each interface's
-/// operations follow in the order below, and that order must not change.
+/// The interfaces that cross the library's boundary. Operations are declared
+/// in method-table order: after the three reference-counting operations of
+/// IInterface, each interface's operations follow in the order below, and
+/// that order must not change.
 
-#include "kernel/gdblogevent.h"
+#include "mi/gdbinternalprocess.h"
 #include "mi/gdbresult.h"
+#include "platform/interfaced.h"
 #include "platform/types.h"
 
 #include <array>
-#include <atomic>
-#include <compare>
-#include <cstddef>
+#include <stdexcept>
 #include <cstdint>
 #include <string>
 #include <string_view>
-#include <tuple>
-#include <type_traits>
-#include <utility>
 
 namespace midebug {
 
-// ---------------------------------------------------------------------------
-// Interface identity and reference counting
-
-/// A 128-bit interface identifier.
-struct TGUID {
-  uint32_t D1 = 0;
-  uint16_t D2 = 0;
-  uint16_t D3 = 0;
-  std::array<uint8_t, 8> D4{};
-
-  /// Reads the registry form "{XXXXXXXX-XXXX-XXXX-XXXX-XXXXXXXXXXXX}"
-  /// (hexadecimal digits in either case). Any other text gives the null
-  /// identifier, which no interface uses.
-  static constexpr TGUID Parse(std::string_view Text);
-
-  friend constexpr bool operator==(const TGUID&, const TGUID&) = default;
-  friend constexpr auto operator<=>(const TGUID&, const TGUID&) = default;
-};
-
-namespace guiddetail {
-
-constexpr int HexDigit(char C) {
-  if (C >= '0' && C <= '9')
-    return C - '0';
-  if (C >= 'a' && C <= 'f')
-    return C - 'a' + 10;
-  if (C >= 'A' && C <= 'F')
-    return C - 'A' + 10;
-  return -1;
-}
-
-/// The value of Count hexadecimal digits at Pos, or -1 when one is not a
-/// digit.
-constexpr int64_t HexValue(std::string_view Text, std::size_t Pos, std::size_t Count) {
-  int64_t Value = 0;
-  for (std::size_t Index = Pos; Index < Pos + Count; ++Index) {
-    int Digit = HexDigit(Text[Index]);
-    if (Digit < 0)
-      return -1;
-    Value = Value * 16 + Digit;
-  }
-  return Value;
-}
-
-} // namespace guiddetail
-
-constexpr TGUID TGUID::Parse(std::string_view Text) {
-  // {XXXXXXXX-XXXX-XXXX-XXXX-XXXXXXXXXXXX}: 38 characters.
-  if (Text.size() != 38 || Text[0] != '{' || Text[37] != '}' || Text[9] != '-' || Text[14] != '-' ||
-      Text[19] != '-' || Text[24] != '-')
-    return TGUID{};
-  const int64_t D1 = guiddetail::HexValue(Text, 1, 8);
-  const int64_t D2 = guiddetail::HexValue(Text, 10, 4);
-  const int64_t D3 = guiddetail::HexValue(Text, 15, 4);
-  if (D1 < 0 || D2 < 0 || D3 < 0)
-    return TGUID{};
-  TGUID Result{static_cast<uint32_t>(D1), static_cast<uint16_t>(D2), static_cast<uint16_t>(D3), {}};
-  // The last eight bytes: two before the fourth hyphen, six after it.
-  constexpr std::array<std::size_t, 8> BytePos = {20, 22, 25, 27, 29, 31, 33, 35};
-  for (std::size_t Index = 0; Index < BytePos.size(); ++Index) {
-    const int64_t Byte = guiddetail::HexValue(Text, BytePos[Index], 2);
-    if (Byte < 0)
-      return TGUID{};
-    Result.D4[Index] = static_cast<uint8_t>(Byte);
-  }
-  return Result;
-}
-
-/// QueryInterface answers.
-inline constexpr int32_t IntfResultOk = 0;
-inline constexpr int32_t IntfResultNoInterface = static_cast<int32_t>(0x80004002u);
-
-/// The root of every interface: reference counting and the question for
-/// another interface of the same object. Interfaces are never deleted
-/// through a pointer to them; the object deletes itself on its last
-/// Release.
-class IInterface {
+/// Raised only where a process cannot be started, created, attached or given
+/// a process id; it reaches the IDE through the process manager.
+class ENonAIRException : public std::runtime_error {
 public:
-  static constexpr TGUID IID = TGUID::Parse("{00000000-0000-0000-C000-000000000046}");
-
-  virtual int32_t QueryInterface(const TGUID& IID, void** Obj) = 0;
-  virtual int32_t AddRef() = 0;
-  virtual int32_t Release() = 0;
-protected:
-  ~IInterface() = default;
+  using std::runtime_error::runtime_error;
 };
 
-/// Holds one reference to an interface: taking a raw pointer adds a
-/// reference, dropping the holder releases it.
-template <class I>
-class TIntfPtr {
-public:
-  TIntfPtr() noexcept = default;
-  TIntfPtr(std::nullptr_t) noexcept {}
-  TIntfPtr(I* Intf) : FIntf(Intf) {
-    if (FIntf)
-      FIntf->AddRef();
-  }
-  TIntfPtr(const TIntfPtr& Other) : TIntfPtr(Other.FIntf) {}
-  TIntfPtr(TIntfPtr&& Other) noexcept : FIntf(std::exchange(Other.FIntf, nullptr)) {}
-  /// From a holder of a derived interface.
-  template <class J>
-    requires std::is_convertible_v<J*, I*>
-  TIntfPtr(const TIntfPtr<J>& Other) : TIntfPtr(static_cast<I*>(Other.get())) {}
-  template <class J>
-    requires std::is_convertible_v<J*, I*>
-  TIntfPtr(TIntfPtr<J>&& Other) noexcept : FIntf(Other.Detach()) {}
-
-  ~TIntfPtr() {
-    if (FIntf)
-      FIntf->Release();
-  }
-
-  TIntfPtr& operator=(const TIntfPtr& Other) {
-    TIntfPtr(Other).Swap(*this);
-    return *this;
-  }
-  TIntfPtr& operator=(TIntfPtr&& Other) noexcept {
-    TIntfPtr(std::move(Other)).Swap(*this);
-    return *this;
-  }
-  TIntfPtr& operator=(std::nullptr_t) {
-    reset();
-    return *this;
-  }
-
-  /// Takes over a reference the caller already holds (the one QueryInterface
-  /// added, for instance) without adding another.
-  static TIntfPtr Adopt(I* Intf) noexcept {
-    TIntfPtr Result;
-    Result.FIntf = Intf;
-    return Result;
-  }
-  /// Gives up the held reference to the caller without releasing it.
-  I* Detach() noexcept { return std::exchange(FIntf, nullptr); }
-
-  void reset() { TIntfPtr().Swap(*this); }
-  void Swap(TIntfPtr& Other) noexcept { std::swap(FIntf, Other.FIntf); }
-
-  I* get() const noexcept { return FIntf; }
-  I* operator->() const noexcept { return FIntf; }
-  I& operator*() const noexcept { return *FIntf; }
-  explicit operator bool() const noexcept { return FIntf != nullptr; }
-
-  friend bool operator==(const TIntfPtr& Left, std::nullptr_t) noexcept { return Left.FIntf == nullptr; }
-  template <class J>
-  friend bool operator==(const TIntfPtr& Left, const TIntfPtr<J>& Right) noexcept {
-    return Left.get() == Right.get();
-  }
-
-private:
-  I* FIntf = nullptr;
-};
-
-/// Asks the object behind Source for interface J; null when it has none.
-template <class J, class I>
-TIntfPtr<J> QueryIntf(const TIntfPtr<I>& Source) {
-  void* Obj = nullptr;
-  if (!Source || Source->QueryInterface(J::IID, &Obj) != IntfResultOk)
-    return nullptr;
-  return TIntfPtr<J>::Adopt(static_cast<J*>(Obj));
-}
-
-/// The reference count behind interfaces. The count starts at 0; the first
-/// TIntfPtr takes it to 1, and the Release that brings it back to 0 deletes
-/// the object. Counts may change on any thread.
-class TInterfacedObject {
-public:
-  TInterfacedObject() = default;
-  TInterfacedObject(const TInterfacedObject&) = delete;
-  TInterfacedObject& operator=(const TInterfacedObject&) = delete;
-  virtual ~TInterfacedObject() = default;
-
-  Integer RefCount() const noexcept { return FRefCount.load(std::memory_order_relaxed); }
-
-protected:
-  int32_t DoAddRef() noexcept { return FRefCount.fetch_add(1, std::memory_order_relaxed) + 1; }
-  int32_t DoRelease() noexcept {
-    // acq_rel: every write made through other references happens before the
-    // deletion on the thread that drops the last one.
-    const int32_t Remaining = FRefCount.fetch_sub(1, std::memory_order_acq_rel) - 1;
-    if (Remaining == 0) {
-      BeforeDestruction();
-      delete this;
-    }
-    return Remaining;
-  }
-  /// Runs when the last reference has gone, just before deletion, while the
-  /// object is still whole: the place to stop threads that call into it.
-  virtual void BeforeDestruction() {}
-
-private:
-  std::atomic<int32_t> FRefCount{0};
-};
-
-/// An object implementing the interfaces Intfs, each of which names its
-/// identifier as I::IID. Supplies the three operations of IInterface once
-/// for all of them; QueryInterface answers for each of Intfs and for
-/// IInterface itself.
-template <class... Intfs>
-  requires(sizeof...(Intfs) > 0)
-class TInterfaced : public TInterfacedObject, public Intfs... {
-public:
-  int32_t QueryInterface(const TGUID& IID, void** Obj) override {
-    if (!Obj)
-      return IntfResultNoInterface;
-    *Obj = nullptr;
-    // The pointer handed out must be of exactly the interface asked for.
-    const bool Found = IID == IInterface::IID ? Offer<IInterface, FirstIntf>(Obj) : (Offer<Intfs>(IID, Obj) || ...);
-    if (!Found)
-      return IntfResultNoInterface;
-    DoAddRef();
-    return IntfResultOk;
-  }
-  int32_t AddRef() final { return DoAddRef(); }
-  int32_t Release() final { return DoRelease(); }
-
-private:
-  using FirstIntf = std::tuple_element_t<0, std::tuple<Intfs...>>;
-
-  /// Stores this object as an I*, reached through Via when I is ambiguous.
-  template <class I, class Via = I>
-  bool Offer(void** Obj) {
-    *Obj = static_cast<I*>(static_cast<Via*>(this));
-    return true;
-  }
-  template <class I>
-  bool Offer(const TGUID& IID, void** Obj) {
-    return IID == I::IID && Offer<I>(Obj);
-  }
-};
 
 // ---------------------------------------------------------------------------
 // Enumerations
@@ -269,64 +40,6 @@ inline constexpr std::array<std::string_view, 3> GDBLanguageNames = {"pascal", "
 enum TGDBRetCode : uint8_t { ercOk = 0, ercError = 1, ercDeferred = 2, ercBusy = 3 };
 
 enum TThreadState : uint8_t { tsStop = 0, tsRunnable = 1, tsBlocked = 2, tsNone = 3, tsZombie = 4 };
-
-/// Why a thread last stopped.
-enum TThreadStopReason : uint8_t {
-  tsrNotStopped = 0,
-  tsrUnknown = 1,
-  tsrAtBreakpoint = 2,
-  tsrStepDone = 3,
-  tsrFCallDone = 4,
-  tsrSignal = 5,
-  tsrError = 6,
-  tsrExceptRaised = 7,
-};
-
-// ---------------------------------------------------------------------------
-// The process as the output parser sees it
-
-/// Implemented by the process; the output parser reports what it reads
-/// through it and finds the result objects of pending requests.
-class IGDBInternalProcess : public IInterface {
-public:
-  static constexpr TGUID IID = TGUID::Parse("{FF5F9453-8CDC-456A-8A94-A3640DD63033}");
-
-  virtual void NotifyLogEvent(const TGDBLogEvent& Event) = 0;
-  virtual void NotifyProcessStarted() = 0;
-  virtual void NotifyProcessExited(Integer Code, const std::string& Signal) = 0;
-  virtual void NotifyProcessResumed() = 0;
-  virtual void NotifyProcessFaulted(const std::string& Message) = 0;
-  virtual void NotifyProcessSuspended(const TGDBLocation& Location, Integer ThreadId, TThreadStopReason Reason) = 0;
-  virtual void NotifySignalReceived(const TGDBException& SignalException, Integer ThreadId) = 0;
-  virtual void NotifyExceptionRaised(const TGDBException& LanguageException, Integer ThreadId) = 0;
-  virtual void NotifyThreadCreated(Integer ThreadId, Integer OsId) = 0;
-  virtual void NotifyThreadExited(Integer ThreadId) = 0;
-  virtual void NotifyThreadSelected(Integer ThreadId) = 0;
-  virtual void NotifyProcessPidCreated(Integer Pid) = 0;
-  virtual void NotifyLanguageChanged(const std::string& LanguageName) = 0;
-  virtual void NotifySettingMaxChildrenCountChanged(Integer Count) = 0;
-  virtual void NotifyModuleLoaded(const TGDBModule& Module) = 0;
-  virtual void NotifyModuleUnLoaded(const TGDBModule& Module) = 0;
-  /// True when the breakpoint has a listener.
-  virtual bool NotifyBreakpointOccurred(Integer Breakpoint, const TGDBLocation& Location, Integer ThreadId) = 0;
-  virtual void NotifyBreakpointModified(Integer Breakpoint, const TGDBLocation& Location) = 0;
-  virtual void NotifyWatchpointOutOfScope() = 0;
-  virtual void NotifyProcessRestart() = 0;
-  /// Takes the result object waiting under Key out of the table; null when
-  /// none waits. The object stays owned by its requester.
-  virtual TGDBResult* RemoveWaitObject(const std::string& Key) = 0;   // not owned by the table
-  virtual std::string GetEndOfLineMarker() = 0;
-  virtual bool IsLLDB() = 0;
-  virtual bool IsAndroid64() = 0;
-  virtual bool IsLinux() = 0;
-  virtual bool IsWindows() = 0;
-  virtual bool IsAttachMode() = 0;
-  virtual bool SupportHXConsole() = 0;
-  virtual bool IsDying() = 0;
-  /// A stable id per module name.
-  virtual Integer GetModuleId(const std::string& Name) = 0;
-};
-
 
 // ---------------------------------------------------------------------------
 // The library's boundary

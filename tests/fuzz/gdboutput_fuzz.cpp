@@ -1,8 +1,10 @@
 // libFuzzer target: any bytes as a reply block, with a result object of any
 // kind waiting under every token the block names.
 
-#include "midebug.h"
 #include "../nullprocess.h"
+#include "mi/gdbcommand.h"
+#include "mi/gdboutput.h"
+#include "midebug.h"
 
 #include <cstddef>
 #include <cstdint>

@@ -129,7 +129,7 @@ bool TCliSession::Start() {
     const TGDBLanguage Language = FOptions.Language.value_or(GuessLanguage(FOptions.Program));
     const TGDBCPU CPU = FOptions.CPU.value_or(GuessCPU(FOptions.Program));
     FProcess = TGDBProcessManager::CreateProcess(FListener, FOptions.Program, JoinArguments(FOptions.Arguments),
-                                                 GetCurrentDir(), FOptions.Profile, FOptions.Platform, Language, CPU,
+                                                 std::filesystem::current_path().string(), FOptions.Profile, FOptions.Platform, Language, CPU,
                                                  FOptions.Debugger);
     FState = TRunState::Loaded;
     FOutput.Emit({{"event", "loaded"},

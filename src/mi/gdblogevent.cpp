@@ -1,4 +1,4 @@
-#include "kernel/gdblogevent.h"
+#include "mi/gdblogevent.h"
 
 namespace midebug {
 

@@ -6,7 +6,7 @@
 /// starts debuggers on this machine, is always registered.
 
 #include "kernel/raclient.h"
-#include "process/gdbinterfaces.h"
+#include "platform/interfaced.h"
 
 #include <map>
 #include <memory>

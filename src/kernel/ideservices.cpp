@@ -1,4 +1,4 @@
-#include "process/ideservices.h"
+#include "kernel/ideservices.h"
 
 #include "kernel/localagent.h"
 
