@@ -40,11 +40,7 @@ void BM_SyncRequestVsKernel(benchmark::State& State) {
     const TClock::time_point ProcessStart = TClock::now();
     std::string Token;
     TGdbShowResult Show;
-    std::string Line;
-    {
-      std::lock_guard Guard(Core.CommandLock());
-      Line = Core.Command().CreateGDBShowCommand(Token, "height");
-    }
+    const std::string Line = Core.Requests().Build(Token, &TGDBCommand::CreateGDBShowCommand, "height");
     Core.ProcessSyncRequest(Token, Line, Show);
     const TClock::time_point KernelStart = TClock::now();
     Kernel.SendRequest(std::to_string(++KernelRequest) + "-gdb-show height");

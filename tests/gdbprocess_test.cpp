@@ -118,7 +118,7 @@ TEST_F(ProcessTest, GdbThroughTheLocalProfileLoadsRunsAndReportsTheExit) {
   TGDBProcess& Core = ProcessOf(Process);
   EXPECT_TRUE(Core.IsLinux());
   EXPECT_FALSE(Core.IsLLDB());
-  EXPECT_EQ(Core.SyncRequestTimeout(), DefaultWaitPolicy().RunningTimeoutMs);
+  EXPECT_EQ(Core.Requests().SyncTimeout(), DefaultWaitPolicy().RunningTimeoutMs);
   ASSERT_TRUE(Core.ProcessAsyncRequest("-exec-run"));
   const Integer Pid = Process->GetPid();
   EXPECT_GT(Pid, 1);
@@ -306,7 +306,7 @@ wait-eof
 
   std::string Token;
   TStackInfoDepthResult Depth;
-  std::string Line = Core.Command().CreateStackInfoDepthCommand(Token, -1);
+  std::string Line = Core.Requests().Build(Token, &TGDBCommand::CreateStackInfoDepthCommand, -1);
   EXPECT_TRUE(Core.ProcessSyncRequest(Token, Line, Depth));
   EXPECT_EQ(Waits, (std::vector<Integer>{60, 90, 120, 150, 150}));
   EXPECT_EQ(Listener->FatalAsks(), 5u);
@@ -316,7 +316,7 @@ wait-eof
 
   // Given up for good: the next request is still written but returns at once.
   TStackInfoDepthResult Again;
-  Line = Core.Command().CreateStackInfoDepthCommand(Token, -1);
+  Line = Core.Requests().Build(Token, &TGDBCommand::CreateStackInfoDepthCommand, -1);
   EXPECT_TRUE(Core.ProcessSyncRequest(Token, Line, Again));
   EXPECT_TRUE(Again.FTimeOut);
   EXPECT_EQ(Listener->FatalAsks(), 5u);
@@ -335,7 +335,7 @@ wait-eof
   TGDBProcess& Core = ProcessOf(Process);
   std::string Token;
   TStackInfoDepthResult Depth;
-  Core.ProcessSyncRequest(Token, Core.Command().CreateStackInfoDepthCommand(Token, -1), Depth);
+  Core.ProcessSyncRequest(Token, Core.Requests().Build(Token, &TGDBCommand::CreateStackInfoDepthCommand, -1), Depth);
   EXPECT_EQ(Depth.FErrorMessage, "Connection device timeout");
   Core.NotifyProcessExited(0, "");
 }
@@ -353,7 +353,7 @@ exit 9
   TGDBProcess& Core = ProcessOf(Process);
   std::string Token;
   TStackInfoDepthResult Depth;
-  EXPECT_TRUE(Core.ProcessSyncRequest(Token, Core.Command().CreateStackInfoDepthCommand(Token, -1), Depth));
+  EXPECT_TRUE(Core.ProcessSyncRequest(Token, Core.Requests().Build(Token, &TGDBCommand::CreateStackInfoDepthCommand, -1), Depth));
   EXPECT_FALSE(Depth.FAvailable);
   EXPECT_FALSE(Depth.FTimeOut);
   EXPECT_FALSE(Core.Alive());
@@ -394,7 +394,7 @@ TEST(ProcessPolling, WaitForReplyTimeOutCountsDownInPollSteps) {
   TGDBProcess& Core = ProcessOf(Holder);
   Integer Timeout = 10;
   int Calls = 0;
-  while (!Core.WaitForReplyTimeOut(Timeout, false))
+  while (!Core.Requests().WaitForReplyTimeOut(Timeout, false))
     ++Calls;
   EXPECT_EQ(Calls, 5);
 }

@@ -306,31 +306,31 @@ TEST_F(RunControl, StepsReachTheListenerWithThreadLocationAndReason) {
   Process->Run();
   ASSERT_TRUE(NextStop());
   EXPECT_EQ(StopLocation().Line, MainFirstLine);
-  TGDBProcess& Core = ProcessOf(Process);
+  const TIntfPtr<IGDBThread> Thread = Process->GetThread(Process->GetSuspendedThreadId());
 
-  Core.StepOver();
+  Thread->StepOver();
   ASSERT_TRUE(NextStop());
   EXPECT_EQ(Process->GetSuspendedThreadId(), 1);
   EXPECT_EQ(StopReason(), tsrStepDone);
   EXPECT_EQ(StopLocation().Line, MainCallLine);
   EXPECT_TRUE(Listener->HasCall("Resumed(1)"));
 
-  Core.StepInto();
+  Thread->StepInto();
   ASSERT_TRUE(NextStop());
   EXPECT_EQ(StopReason(), tsrStepDone);
   EXPECT_EQ(StopLocation().Line, TwiceBodyLine);
 
   const UInt64 Before = StopLocation().Address;
-  Core.InstStepInto();
+  Thread->InstStepInto();
   ASSERT_TRUE(NextStop());
   EXPECT_EQ(StopReason(), tsrStepDone);
   EXPECT_NE(StopLocation().Address, Before);
   const UInt64 AfterInto = StopLocation().Address;
-  Core.InstStepOver();
+  Thread->InstStepOver();
   ASSERT_TRUE(NextStop());
   EXPECT_NE(StopLocation().Address, AfterInto);
 
-  Core.StepOut();
+  Thread->StepOut();
   ASSERT_TRUE(NextStop());
   EXPECT_EQ(StopReason(), tsrStepDone);
   EXPECT_EQ(StopLocation().Line, MainCallLine);
@@ -543,7 +543,7 @@ TEST_F(RunControl, DebuggerDyingEndsTheSessionWithoutHanging) {
   TGDBProcess& Core = ProcessOf(Process);
   std::string Token;
   TVarCreateResult Variable;
-  const std::string Line = Core.Command().CreateVarCreateCommand(Token, "-", "a", 0);
+  const std::string Line = Core.Requests().Build(Token, [](TGDBCommand& Builder, std::string& Key) { return Builder.CreateVarCreateCommand(Key, "-", "a", 0); });
   Core.ProcessSyncRequest(Token, Line, Variable);
   EXPECT_FALSE(Variable.FAvailable && !Variable.FError);
   ASSERT_TRUE(Listener->PumpUntilCall("Exited("));
@@ -551,7 +551,7 @@ TEST_F(RunControl, DebuggerDyingEndsTheSessionWithoutHanging) {
   EXPECT_FALSE(Core.Alive());
   // Nothing waits for the lost debugger any more.
   TStackInfoDepthResult Depth;
-  const std::string DepthLine = Core.Command().CreateStackInfoDepthCommand(Token, -1);
+  const std::string DepthLine = Core.Requests().Build(Token, &TGDBCommand::CreateStackInfoDepthCommand, -1);
   Core.ProcessSyncRequest(Token, DepthLine, Depth);
   EXPECT_FALSE(Depth.FAvailable && !Depth.FError);
   EXPECT_TRUE(ReleaseAndCheckDebuggerGone());
@@ -598,7 +598,7 @@ TEST_F(RunControlFake, ThreadBurstIsOneDeliveryLatestThreadFirst) {
   TGDBProcess& Core = ProcessOf(Process);
   std::string Token;
   TStackInfoDepthResult Depth;
-  const std::string Line = Core.Command().CreateStackInfoDepthCommand(Token, -1);
+  const std::string Line = Core.Requests().Build(Token, &TGDBCommand::CreateStackInfoDepthCommand, -1);
   ASSERT_TRUE(Core.ProcessSyncRequest(Token, Line, Depth));
   ASSERT_FALSE(Depth.FError);
   EXPECT_EQ(ProcessPending(), 1u);

@@ -3,6 +3,7 @@
 // header lines, frame locations, and thread and frame selection.
 
 #include "inspect/gdbthread.h"
+#include "inspect/gdbthreadtable.h"
 #include "midebug.h"
 #include "process/gdbprocess.h"
 #include "testlistener.h"
@@ -196,16 +197,16 @@ TEST_F(ThreadsInC, SelectedFrameIsWhereTheDebuggerActsUntilTheThreadIsSelectedAg
   Of(MainThread).SelectFrame(Main);
   EXPECT_EQ(Of(MainThread).FFrameIndex, Main - 1);
   EXPECT_EQ(MainThread->GetCurrentLocation().Line, 12);
-  EXPECT_EQ(Core().GetCurrentLocation().Line, 12) << "the debugger's frame is main's";
+  EXPECT_EQ(Core().Threads().CurrentLocation().Line, 12) << "the debugger's frame is main's";
 
   Of(Worker).SetAsSuspendedThread();
   EXPECT_EQ(Process->GetSuspendedThreadId(), 2);
-  EXPECT_EQ(Core().GetCurrentLocation().Line, 4);
+  EXPECT_EQ(Core().Threads().CurrentLocation().Line, 4);
 
   Of(MainThread).SetAsSuspendedThread();
   EXPECT_EQ(Process->GetSuspendedThreadId(), 1);
   EXPECT_EQ(Of(MainThread).FFrameIndex, 0);
-  EXPECT_EQ(Core().GetCurrentLocation().Address, MainThread->GetCallLocation(1).Address)
+  EXPECT_EQ(Core().Threads().CurrentLocation().Address, MainThread->GetCallLocation(1).Address)
       << "back at the innermost frame in the debugger";
 }
 
@@ -217,7 +218,7 @@ TEST_F(ThreadsInC, FrameSelectionOutsideTheStackChangesNothing) {
     Of(Worker).SelectFrame(Frame);
     EXPECT_EQ(Of(Worker).FFrameIndex, 1) << Frame;
   }
-  EXPECT_EQ(Core().GetCurrentLocation().Line, 5) << "still in outer";
+  EXPECT_EQ(Core().Threads().CurrentLocation().Line, 5) << "still in outer";
 }
 
 TEST_F(ThreadsInC, UnknownThreadNumbersGiveTheZombieWhichHasNoStack) {
@@ -231,7 +232,7 @@ TEST_F(ThreadsInC, UnknownThreadNumbersGiveTheZombieWhichHasNoStack) {
   // Nor does it show whatever thread the debugger is on when the process
   // has no current thread.
   Core().NotifyThreadExited(1);
-  Core().SetSuspendedThread(1);
+  Core().Threads().Select(1);
   ASSERT_EQ(Process->GetSuspendedThreadId(), -1);
   EXPECT_EQ(Unknown->GetCallCount(), 0);
   EXPECT_EQ(Unknown->GetCallHeader(1), "");
@@ -240,15 +241,15 @@ TEST_F(ThreadsInC, UnknownThreadNumbersGiveTheZombieWhichHasNoStack) {
 TEST_F(ThreadsInC, SelectingThreadsTheDebuggerOrTheTableDoesNotKnow) {
   // GDB refuses a number it does not know: its current thread stays, and so
   // does the process's.
-  Core().SetSuspendedThread(7);
+  Core().Threads().Select(7);
   EXPECT_EQ(Process->GetSuspendedThreadId(), 2);
 
   // A thread GDB knows but the table does not leaves no current thread.
   Core().NotifyThreadExited(1);
-  Core().SetSuspendedThread(1);
+  Core().Threads().Select(1);
   EXPECT_EQ(Process->GetSuspendedThreadId(), -1);
 
-  Core().SetSuspendedThread(2);
+  Core().Threads().Select(2);
   EXPECT_EQ(Process->GetSuspendedThreadId(), 2);
   EXPECT_EQ(Worker->GetCurrentLocation().Line, 4);
 }
@@ -292,7 +293,7 @@ TEST_F(ThreadsTest, CppFramesShowQualifiedNamesAndEmptyParenthesesWithoutArgumen
   ASSERT_FALSE(Program.empty());
   ASSERT_NO_FATAL_FAILURE(Launch(Program, glCPP, {"Calc::twice"}));
   const TIntfPtr<IGDBThread> Thread = Process->GetThread(1);
-  Core().SetSuspendedThread(1);
+  Core().Threads().Select(1);
   ASSERT_EQ(Process->GetSuspendedThreadId(), 1);
   EXPECT_EQ(Thread->GetCurrentLocation().Line, 3) << "the selection's reply gives the location";
 
@@ -330,7 +331,7 @@ TEST_F(ThreadsTest, PascalFramesShowArgumentValuesAndAnAddressWhereSourceIsMissi
   ASSERT_FALSE(Program.empty());
   ASSERT_NO_FATAL_FAILURE(Launch(Program, glPascal, {"ADD", "BYE"}));
   TIntfPtr<IGDBThread> Thread = Process->GetThread(1);
-  Core().SetSuspendedThread(1);
+  Core().Threads().Select(1);
 
   ASSERT_EQ(Thread->GetCallCount(), 3);
   EXPECT_EQ(Thread->GetCallHeader(1), "ADD(1,2)");

@@ -1,7 +1,8 @@
-// The process's side of threads and call stacks: which thread and frame the
-// debugger acts on, the stack depth, and the header lines of the frames.
+// Threads and call stacks: the thread table's requests (which thread and
+// frame the debugger acts on, the stack depth, the header lines of the
+// frames, the refresh of the table) and the process's thread events.
 
-#include "inspect/gdbthread.h"
+#include "inspect/gdbthreadtable.h"
 #include "process/gdbprocess.h"
 
 #include <algorithm>
@@ -53,86 +54,74 @@ std::string CHeader(const TGDBStackFrame& Frame, const TNameValueArray& Argument
   return Header + ")";
 }
 
+/// Tells a Windows program's language runtime that a debugger is present.
+constexpr const char* WindowsDebugHookLine = "expr *((int*)&__CPPdebugHook) = 1";
+/// The same for an Android64 program.
+constexpr const char* Android64DebugHookLine = "expr -l Tessel -- System.DebugHook := 1";
+
+bool IsEmptyLocation(const TGDBLocation& Location) { return Location.Line == 0 && Location.Address == 0; }
+
 } // namespace
 
-void TGDBProcess::SetSuspendedThread(Integer ThreadId) {
-  const bool UseCLI = FKernel->IsLLDB();
+// --- The thread table's requests ---------------------------------------------
+
+TGDBLocation TGDBThreadTable::CurrentLocation() {
+  TStackInfoFrameResult Frame;
+  if (!FProcess.Requests().Ask(Frame, &TGDBCommand::CreateStackInfoFrameCommand))
+    return DummyLocation;
+  return FixupInlineLocation(Frame.FLocation);
+}
+
+void TGDBThreadTable::Select(Integer ThreadId) {
+  const bool UseCLI = FProcess.Kernel().IsLLDB();
   std::string Token;
-  const std::string Line = BuildCommand(Token, [ThreadId, UseCLI](TGDBCommand& Builder, std::string& Key) {
-    return Builder.CreateThreadSelectCommand(Key, ThreadId, UseCLI);
-  });
+  const std::string Line = FProcess.Requests().Build(Token, &TGDBCommand::CreateThreadSelectCommand, ThreadId, UseCLI);
   TThreadSelectResult Selected(ThreadId);
   if (UseCLI) {
     // LLDB's CLI "thread select" carries no token, so its reply cannot be
     // matched: the location is asked for separately.
-    if (!ProcessAsyncRequest(Line))
+    if (!FProcess.ProcessAsyncRequest(Line))
       return;
     Selected.FFrameIndex = 0;
-    Selected.FLocation = GetCurrentLocation();
-  } else if (!ProcessSyncRequest(Token, Line, Selected) || Selected.FError || Selected.FTimeOut) {
+    Selected.FLocation = CurrentLocation();
+  } else if (!FProcess.ProcessSyncRequest(Token, Line, Selected) || Selected.FError || Selected.FTimeOut) {
     // The debugger kept its current thread, and so does the process.
     return;
   }
-  std::lock_guard Guard(FThreadLock);
-  const TIntfPtr<IGDBThread> Thread = GetThread(ThreadId);
-  if (Thread.get() == FZombieThread.get()) {
-    FSuspendedThread = nullptr;
-    return;
-  }
-  FSuspendedThread = static_cast<TGDBThread*>(Thread.get());
-  FSuspendedThread->FLocation = Selected.FLocation;
-  FSuspendedThread->FFrameIndex = Selected.FFrameIndex;
+  SetStopped(ThreadId, Selected.FLocation, tsrNotStopped, Selected.FFrameIndex);
 }
 
-void TGDBProcess::SetSuspendedThreadFrame(Integer Frame) {
-  std::string Token;
-  ProcessAsyncRequest(BuildCommand(Token, [Frame](TGDBCommand& Builder, std::string& Key) {
-    return Builder.CreateStackSelectFrameCommand(Key, Frame);
-  }));
+void TGDBThreadTable::SelectFrame(Integer Frame) {
+  FProcess.Requests().Fire(&TGDBCommand::CreateStackSelectFrameCommand, Frame);
   // The debugger answers in order, so the frame asked for next is the one
-  // just selected. The request runs without the thread lock: the output
-  // thread takes it while it reads the reply.
-  const TGDBLocation Location = GetCurrentLocation();
-  std::lock_guard Guard(FThreadLock);
-  if (!FSuspendedThread)
-    return;
-  FSuspendedThread->FFrameIndex = Frame;
-  FSuspendedThread->FLocation = Location;
+  // just selected.
+  SetStoppedFrame(Frame, CurrentLocation());
 }
 
-Integer TGDBProcess::GetCallCount() {
-  std::string Token;
-  const std::string Line = BuildCommand(Token, [](TGDBCommand& Builder, std::string& Key) {
-    return Builder.CreateStackInfoDepthCommand(Key, MaxCallFrames);
-  });
+Integer TGDBThreadTable::CallCount() {
   TStackInfoDepthResult Depth;
-  if (!ProcessSyncRequest(Token, Line, Depth) || Depth.FError || Depth.FTimeOut)
+  if (!FProcess.Requests().Ask(Depth, &TGDBCommand::CreateStackInfoDepthCommand, MaxCallFrames))
     return 0;
   return std::clamp(Depth.FStackDepth, 0, MaxCallFrames);
 }
 
-void TGDBProcess::GetCallHeaders(TStackFrameArray& Frames) {
+void TGDBThreadTable::CallHeaders(TStackFrameArray& Frames) {
   Frames.clear();
   Integer Digits = 0;
-  std::string Token;
-  const std::string FramesLine = BuildCommand(Token, [&Digits](TGDBCommand& Builder, std::string& Key) {
-    Digits = Builder.FAddressDigits;
-    return Builder.CreateStackListFramesCommand(Key, 0, MaxCallFrames - 1);
-  });
   TStackListFramesResult Listed;
-  if (!ProcessSyncRequest(Token, FramesLine, Listed) || Listed.FError || Listed.FTimeOut)
+  const bool HasFrames = FProcess.Requests().Ask(Listed, [&Digits](TGDBCommand& Builder, std::string& Token) {
+    Digits = Builder.FAddressDigits;
+    return Builder.CreateStackListFramesCommand(Token, 0, MaxCallFrames - 1);
+  });
+  if (!HasFrames)
     return;
   Frames = std::move(Listed.FStackFrames);
 
-  const std::string ArgumentsLine = BuildCommand(Token, [](TGDBCommand& Builder, std::string& Key) {
-    return Builder.CreateStackListArgumentsCommand(Key, false, 0, MaxCallFrames - 1);
-  });
   TStackListArgumentsResult Arguments;
   // Without arguments the frames keep their bare function names.
-  if (!ProcessSyncRequest(Token, ArgumentsLine, Arguments) || Arguments.FError || Arguments.FTimeOut)
+  if (!FProcess.Requests().Ask(Arguments, &TGDBCommand::CreateStackListArgumentsCommand, false, 0, MaxCallFrames - 1))
     return;
-
-  const bool Pascal = FLanguage == glPascal;
+  const bool Pascal = FProcess.GetEvaluator() == glPascal;
   const size_t Count = std::min(Arguments.FStackArguments.size(), Frames.size());
   for (size_t Index = 0; Index < Count; ++Index) {
     TGDBStackFrame& Frame = Frames[Index];
@@ -148,6 +137,117 @@ void TGDBProcess::GetCallHeaders(TStackFrameArray& Frames) {
     for (const TNameValue& Value : Values)
       Frame.Params.push_back(Value.Name);
   }
+}
+
+void TGDBThreadTable::RefreshList() {
+  TThreadListIdsResult Ids;
+  if (!FProcess.Requests().Ask(Ids, &TGDBCommand::CreateThreadListIdsCommand) || !FProcess.FAlive) {
+    FProcess.FUpdateThreadState = false;
+    return;
+  }
+  std::vector<Integer> Created;
+  std::vector<Integer> Exited;
+  Merge(Ids, Created, Exited);
+  FProcess.FUpdateThreadState = false;
+  const TIntfPtr<IGDBProcessListener>& Listener = FProcess.FProcessListener;
+  if (!Listener)
+    return;
+  for (const Integer Id : Created)
+    Listener->ThreadCreated(Id);
+  for (const Integer Id : Exited)
+    Listener->ThreadExited(Id);
+}
+
+void TGDBThreadTable::RefreshStates(bool StateOnly) {
+  TGDBKernel& Kernel = FProcess.Kernel();
+  if (!Kernel.SupportThreadInfoCommand() || !(FProcess.FAsyncTarget || FProcess.FSuspended))
+    return;
+  TThreadInfoResult Info(StateOnly);
+  if (FProcess.Requests().Ask(Info, &TGDBCommand::CreateThreadInfoCommand, -1) && FProcess.FAlive)
+    Apply(Info, (Kernel.IsWindows() || Kernel.IsAndroid64()) && FProcess.FSuspended);
+  FProcess.FUpdateThreadState = false;
+}
+
+bool TGDBThreadTable::StatesStale() const { return FProcess.FUpdateThreadState; }
+
+// --- The process's thread events ---------------------------------------------
+
+TGDBLocation TGDBProcess::GetSuspendedLocation() { return FThreads->StoppedLocation(); }
+Integer TGDBProcess::GetSuspendedThreadId() { return FThreads->StoppedId(); }
+TIntfPtr<IGDBThread> TGDBProcess::GetThread(Integer Id) { return FThreads->Get(Id); }
+
+void TGDBProcess::DoNotifyProcessSuspended(const TGDBLocation& Location, Integer ThreadId, TThreadStopReason Reason) {
+  // A stop that names no thread is inlined code whose frame lacks the
+  // source: the thread is the last one stopped.
+  if (ThreadId == -1) {
+    ThreadId = FLastSuspendedThreadId;
+    FThreads->SetInlineLocation(Location);
+  }
+  if (!FStoppedAtEntryPoint.exchange(true)) {
+    if (!FKernel->IsLLDB()) {
+      FThreads->RefreshList();
+      // GDB's thread-id list carries neither names nor states.
+      FThreads->RefreshStates(false);
+    }
+    if (FKernel->IsWindows())
+      ProcessAsyncRequest(WindowsDebugHookLine);
+    if (FKernel->IsAndroid64())
+      ProcessAsyncRequest(Android64DebugHookLine);
+  } else if (FKernel->SupportThreadNotification()) {
+    FThreads->RefreshStates(false);
+  } else {
+    FThreads->RefreshList();
+  }
+  const TGDBLocation Stopped = IsEmptyLocation(Location) ? FThreads->CurrentLocation() : Location;
+  FThreads->SetStopped(ThreadId, Stopped, Reason);
+  if (FProcessListener)
+    FProcessListener->ProcessSuspended(ThreadId);
+}
+
+void TGDBProcess::SetCurrentSuspendedThread(Integer ThreadId, const TGDBLocation& Location) {
+  if (!FKernel->SupportLanguageChangedNotification())
+    FLanguage = GetCurrentLanguage();
+  FThreads->SetStopped(ThreadId, Location);
+}
+
+void TGDBProcess::EnsureThreadCreated(Integer ThreadId) {
+  if (FKernel->SupportThreadNotification() || ThreadId == -1)
+    return;
+  if (FThreads->Add(ThreadId, ThreadId, "", "") && FProcessListener)
+    FProcessListener->ThreadCreated(ThreadId);
+}
+
+void TGDBProcess::NotifyAllThreadExited() {
+  for (const Integer Id : FThreads->Clear())
+    if (FProcessListener)
+      FProcessListener->ThreadExited(Id);
+}
+
+void TGDBProcess::NotifyThreadCreated(Integer ThreadId, Integer OsId) {
+  if (!FAlive || (!FKernel->IsLLDB() && !FStoppedAtEntryPoint))
+    return;
+  if (!FThreads->Add(ThreadId, OsId, "", ""))
+    return;
+  FThreadCreatedPending.Raise(ThreadId, [this](auto Delivery) { DeferIfLive(std::move(Delivery)); },
+                              [this](Integer Id) {
+                                if (!FDying && !FRequests.FatalError() && FProcessListener)
+                                  FProcessListener->ThreadCreated(Id);
+                              });
+}
+
+void TGDBProcess::NotifyThreadExited(Integer ThreadId) {
+  if (!FKernel->IsLLDB() && !FStoppedAtEntryPoint)
+    return;
+  // Exits of threads the table did not know wait on the stack for the next
+  // delivery; they must not keep later exits from being delivered.
+  const bool Known = FThreads->Remove(ThreadId);
+  FThreadExitedPending.Raise(
+      ThreadId, [this](auto Delivery) { DeferIfLive(std::move(Delivery)); },
+      [this](Integer Id) {
+        if (FProcessListener)
+          FProcessListener->ThreadExited(Id);
+      },
+      Known);
 }
 
 } // namespace midebug

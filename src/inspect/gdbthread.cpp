@@ -1,5 +1,6 @@
 #include "inspect/gdbthread.h"
 
+#include "inspect/gdbthreadtable.h"
 #include "process/gdbprocess.h"
 
 #include <algorithm>
@@ -39,30 +40,30 @@ void TGDBThread::ResetCallStack() {
 std::string TGDBThread::GetName() {
   // The zombie is in no list: asking would only cost a request.
   if (FName.empty() && !ZombieState())
-    FProcess->UpdateAllThreadState(false);
+    FProcess->Threads().RefreshStates(false);
   return FName;
 }
 
 TThreadState TGDBThread::GetState() {
-  if (FProcess->ThreadStatesStale() && !ZombieState())
-    FProcess->UpdateAllThreadState(!FName.empty());
+  if (FProcess->Threads().StatesStale() && !ZombieState())
+    FProcess->Threads().RefreshStates(!FName.empty());
   return FState;
 }
 
 TThreadStopReason TGDBThread::GetStopReason() { return FProcess->Suspended() ? FReason : tsrNotStopped; }
-TGDBCPU TGDBThread::GetCPUType() { return FProcess->Command().FCPUType; }
+TGDBCPU TGDBThread::GetCPUType() { return FProcess->CPU(); }
 TGDBLanguage TGDBThread::GetEvaluator() { return FProcess->GetEvaluator(); }
 
 void TGDBThread::SetAsSuspendedThread() {
   const Integer Current = FProcess->GetSuspendedThreadId();
   if (Current == -1 || Current == FId || ZombieState())
     return;
-  FProcess->SetSuspendedThread(FId);
+  FProcess->Threads().Select(FId);
   // Only once the debugger has really switched: resetting the frame of the
   // thread that stayed current would move that thread's selection instead.
   if (FProcess->GetSuspendedThreadId() != FId || FFrameIndex == 0)
     return;
-  FProcess->SetSuspendedThreadFrame(0);
+  FProcess->Threads().SelectFrame(0);
   FFrameIndex = 0;
 }
 
@@ -73,7 +74,7 @@ void TGDBThread::SelectFrame(Integer Frame) {
   // still be recorded, leaving the thread at a frame it is not at.
   if (Frame > GetCallCount())
     return;
-  FProcess->SetSuspendedThreadFrame(Frame - 1);
+  FProcess->Threads().SelectFrame(Frame - 1);
   FFrameIndex = Frame - 1;
 }
 
@@ -91,7 +92,7 @@ Integer TGDBThread::GetCallCount() {
     SetAsSuspendedThread();
     if (!ActsOnThisThread())
       return 0;
-    FCallCount = FProcess->GetCallCount();
+    FCallCount = FProcess->Threads().CallCount();
   }
   return FCallCount;
 }
@@ -100,7 +101,7 @@ void TGDBThread::RefreshCallStack() {
   if (FCallHeaders.empty()) {
     SetAsSuspendedThread();
     if (ActsOnThisThread())
-      FProcess->GetCallHeaders(FCallHeaders);
+      FProcess->Threads().CallHeaders(FCallHeaders);
   }
   FCallCount = static_cast<Integer>(FCallHeaders.size());
 }
@@ -156,30 +157,17 @@ bool TGDBThread::SetRunToMainBreakpoint(bool& NoEntryStop) {
   return FProcess->SetRunToMainBreakpoint();
 }
 
-void TGDBThread::StepInto() {
+void TGDBThread::Step(TStepCreate Create) {
   SetAsSuspendedThread();
-  FProcess->StepInto();
+  // Sent without waiting: the stop that ends the step arrives later.
+  FProcess->Requests().Fire(Create);
 }
 
-void TGDBThread::StepOver() {
-  SetAsSuspendedThread();
-  FProcess->StepOver();
-}
-
-void TGDBThread::StepOut() {
-  SetAsSuspendedThread();
-  FProcess->StepOut();
-}
-
-void TGDBThread::InstStepInto() {
-  SetAsSuspendedThread();
-  FProcess->InstStepInto();
-}
-
-void TGDBThread::InstStepOver() {
-  SetAsSuspendedThread();
-  FProcess->InstStepOver();
-}
+void TGDBThread::StepInto() { Step(&TGDBCommand::CreateExecStepCommand); }
+void TGDBThread::StepOver() { Step(&TGDBCommand::CreateExecNextCommand); }
+void TGDBThread::StepOut() { Step(&TGDBCommand::CreateExecFinishCommand); }
+void TGDBThread::InstStepInto() { Step(&TGDBCommand::CreateExecStepInstructionCommand); }
+void TGDBThread::InstStepOver() { Step(&TGDBCommand::CreateExecNextInstructionCommand); }
 
 TGDBRetCode TGDBThread::Evaluate(const std::string&, const std::string&, Integer, std::string& Value, bool& CanModify,
                                  std::string& TypeName) {

@@ -2,6 +2,7 @@
 /// \file
 /// One thread of the debugged process as the IDE holds it.
 
+#include "mi/gdbcommand.h"
 #include "process/gdbinterfaces.h"
 
 #include <string>
@@ -89,6 +90,9 @@ public:
   TThreadStopReason FReason = tsrNotStopped;
 
 private:
+  using TStepCreate = std::string (TGDBCommand::*)(std::string& Token);
+  /// Makes this thread the debugger's current one and starts the step.
+  void Step(TStepCreate Create);
   /// True when the debugger's current thread is this one, or when the
   /// process has none (a program whose threads are not listed yet); never
   /// for the zombie.

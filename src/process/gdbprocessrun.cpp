@@ -5,75 +5,16 @@
 
 #include "process/gdbprocess.h"
 
-#include "platform/hostthread.h"
-
-#include <array>
-#include <memory>
-
 namespace midebug {
 
-namespace {
+void TGDBProcess::Run() { FRequests.Fire(&TGDBCommand::CreateExecRunCommand, false); }
 
-/// The entry functions a program's main code may start at, tried in order.
-constexpr std::array<const char*, 5> MainEntryNames = {"main", "WinMain", "wWinMain", "VZMmain", "_NativeMain"};
-
-/// The listener of the run-to-main breakpoint: every hit is a stop the IDE
-/// sees as a breakpoint stop where the program halted.
-class TBreakOnMain : public TInterfaced<IGDBBreakpointListener> {
-public:
-  void BreakpointHits(bool& ShouldStop, Integer /*ThreadId*/, TGDBLocation& /*Location*/) override {
-    ShouldStop = true;
-  }
-  void BreakpointVerified(bool /*Verified*/, Integer /*Breakpoint*/, const TGDBLocation& /*Location*/) override {}
-};
-
-} // namespace
-
-void TGDBProcess::Run() {
-  std::string Token;
-  ProcessAsyncRequest(
-      BuildCommand(Token, [](TGDBCommand& Builder, std::string& Key) { return Builder.CreateExecRunCommand(Key, false); }));
-}
-
-bool TGDBProcess::SetRunToMainBreakpoint() {
-  const bool ByAddress = FLanguage == glPascal && FKernel->FEntryPoint != 0;
-  const UInt64 EntryPoint = FKernel->FEntryPoint;
-  std::unique_ptr<TBreakInsertResult> Inserted;
-  for (const char* Name : MainEntryNames) {
-    Inserted = std::make_unique<TBreakInsertResult>();
-    std::string Token;
-    const std::string Line = BuildCommand(Token, [&](TGDBCommand& Builder, std::string& Key) {
-      return ByAddress ? Builder.CreateBreakInsertCommand(Key, EntryPoint, true)
-                       : Builder.CreateBreakInsertCommand(Key, Name, false, true);
-    });
-    ProcessSyncRequest(Token, Line, *Inserted);
-    if (ByAddress || !Inserted->FError || Inserted->FTimeOut)
-      break;
-  }
-  if (Inserted->FError || Inserted->FBreakpoint == -1)
-    return false;
-  TIntfPtr<IGDBBreakpointListener> Listener(new TBreakOnMain);
-  {
-    std::lock_guard Guard(FBreakpointLock);
-    FBreakpointList[Inserted->FBreakpoint] = Listener;
-  }
-  FBreakOnMain = Listener;
-  return true;
-}
-
-void TGDBProcess::RunToFirstSource() {
-  std::string Token;
-  ProcessAsyncRequest(BuildCommand(
-      Token, [](TGDBCommand& Builder, std::string& Key) { return Builder.CreateExecUntilCommand(Key, "", -1); }));
-}
+void TGDBProcess::RunToFirstSource() { FRequests.Fire(&TGDBCommand::CreateExecUntilCommand, "", -1); }
 
 void TGDBProcess::RunToEntryPoint() {
   if (!FKernel->SupportStopOnEntryPoint())
     SetRunToMainBreakpoint();
-  const bool Start = FKernel->IsLLDB();
-  std::string Token;
-  ProcessAsyncRequest(BuildCommand(
-      Token, [Start](TGDBCommand& Builder, std::string& Key) { return Builder.CreateExecRunCommand(Key, Start); }));
+  FRequests.Fire(&TGDBCommand::CreateExecRunCommand, FKernel->IsLLDB());
 }
 
 void TGDBProcess::Pause() {
@@ -83,9 +24,7 @@ void TGDBProcess::Pause() {
   // makes it the expected interruption is set first.
   if (FAsyncTarget && FKernel->SupportExecInterruptCommand()) {
     FSuspending = true;
-    std::string Token;
-    if (!ProcessAsyncRequest(BuildCommand(
-            Token, [](TGDBCommand& Builder, std::string& Key) { return Builder.CreateExecInterruptCommand(Key); })))
+    if (!FRequests.Fire(&TGDBCommand::CreateExecInterruptCommand))
       FSuspending = false;
     return;
   }
@@ -101,45 +40,13 @@ void TGDBProcess::Resume() {
   if (!FSuspended || FResuming)
     return;
   FResuming = true;
-  std::string Token;
-  if (!ProcessAsyncRequest(
-          BuildCommand(Token, [](TGDBCommand& Builder, std::string& Key) { return Builder.CreateExecContinueCommand(Key); })))
+  if (!FRequests.Fire(&TGDBCommand::CreateExecContinueCommand))
     FResuming = false;
-}
-
-void TGDBProcess::StepInto() {
-  std::string Token;
-  ProcessAsyncRequest(
-      BuildCommand(Token, [](TGDBCommand& Builder, std::string& Key) { return Builder.CreateExecStepCommand(Key); }));
-}
-
-void TGDBProcess::StepOver() {
-  std::string Token;
-  ProcessAsyncRequest(
-      BuildCommand(Token, [](TGDBCommand& Builder, std::string& Key) { return Builder.CreateExecNextCommand(Key); }));
-}
-
-void TGDBProcess::StepOut() {
-  std::string Token;
-  ProcessAsyncRequest(
-      BuildCommand(Token, [](TGDBCommand& Builder, std::string& Key) { return Builder.CreateExecFinishCommand(Key); }));
-}
-
-void TGDBProcess::InstStepInto() {
-  std::string Token;
-  ProcessAsyncRequest(BuildCommand(
-      Token, [](TGDBCommand& Builder, std::string& Key) { return Builder.CreateExecStepInstructionCommand(Key); }));
-}
-
-void TGDBProcess::InstStepOver() {
-  std::string Token;
-  ProcessAsyncRequest(BuildCommand(
-      Token, [](TGDBCommand& Builder, std::string& Key) { return Builder.CreateExecNextInstructionCommand(Key); }));
 }
 
 bool TGDBProcess::SyncTargetPause(bool& Aborted, bool FatalOnExpiry) {
   Aborted = false;
-  if (FAsyncTarget || !FAlive || FFatalError)
+  if (FAsyncTarget || !FAlive || FRequests.FatalError())
     return false;
   if (FSuspended || FSuspending || FInternalPause) {
     if (FInternalPause)
@@ -148,9 +55,9 @@ bool TGDBProcess::SyncTargetPause(bool& Aborted, bool FatalOnExpiry) {
   }
   FInternalPause = true;
   Pause();
-  Integer Timeout = FSyncRequestTimeout;
+  Integer Timeout = FRequests.SyncTimeout();
   while (FSuspending && FAlive) {
-    if (WaitForReplyTimeOut(Timeout, FatalOnExpiry)) {
+    if (FRequests.WaitForReplyTimeOut(Timeout, FatalOnExpiry)) {
       Aborted = true;
       FSuspending = false;
       break;
@@ -160,30 +67,20 @@ bool TGDBProcess::SyncTargetPause(bool& Aborted, bool FatalOnExpiry) {
   return true;
 }
 
-void TGDBProcess::InternalResume() {
+void TGDBProcess::ASyncTargetResume() {
+  if (!FAsyncTarget || !FAlive || FRequests.FatalError())
+    return;
   FInternalResume = true;
   Resume();
-  Integer Timeout = FSyncRequestTimeout;
-  while (FResuming && FAlive && !WaitForReplyTimeOut(Timeout, true)) {
+  Integer Timeout = FRequests.SyncTimeout();
+  while (FResuming && FAlive && !FRequests.WaitForReplyTimeOut(Timeout, true)) {
   }
   FInternalResume = false;
 }
 
-void TGDBProcess::SyncTargetResume() {
-  if (FAsyncTarget || !FAlive || FFatalError)
-    return;
-  InternalResume();
-}
-
-void TGDBProcess::ASyncTargetResume() {
-  if (!FAsyncTarget || !FAlive || FFatalError)
-    return;
-  InternalResume();
-}
-
 void TGDBProcess::Terminate() {
   FDying = true;
-  FSyncRequestTimeout = FWaitPolicy.TerminateTimeoutMs;
+  FRequests.SetSyncTimeout(WaitPolicy().TerminateTimeoutMs);
   bool Aborted = false;
   SyncTargetPause(Aborted, true);
   if (!FAsyncTarget && !FSuspended) {
@@ -191,41 +88,29 @@ void TGDBProcess::Terminate() {
   } else if (FKernel->SupportExecAbortCommand()) {
     if (FAttachMode)
       ASyncTargetResume();
-    std::string Token;
     TExecAbortResult Aborting;
-    const std::string Line =
-        BuildCommand(Token, [](TGDBCommand& Builder, std::string& Key) { return Builder.CreateExecAbortCommand(Key); });
-    ProcessSyncRequest(Token, Line, Aborting);
-    if (Aborting.FError || !Aborting.FAvailable || FKernel->IsAndroid64() || FAttachMode)
+    if (!FRequests.Ask(Aborting, &TGDBCommand::CreateExecAbortCommand) || FKernel->IsAndroid64() || FAttachMode)
       FKernel->Terminate(FPid);
   } else {
     // GDB has no "-exec-abort"; its console "kill" ends a stopped program
     // (and prints no stop record for it).
-    std::string Key;
     TCLKillResult Killed;
-    const std::string Line =
-        BuildCommand(Key, [](TGDBCommand& Builder, std::string& Echo) { return Builder.CreateCLKillCommand(Echo); });
-    ProcessSyncRequest(Key, Line, Killed);
-    if (Killed.FError || !Killed.FAvailable)
+    if (!FRequests.Ask(Killed, &TGDBCommand::CreateCLKillCommand))
       FKernel->Terminate(FPid);
   }
   NotifyProcessExited(0, "");
 }
 
 void TGDBProcess::Detach() {
-  FSyncRequestTimeout = FWaitPolicy.TerminateTimeoutMs;
+  FRequests.SetSyncTimeout(WaitPolicy().TerminateTimeoutMs);
   bool Aborted = false;
   SyncTargetPause(Aborted, true);
   if (FAttachMode)
     ASyncTargetResume();
-  std::string Token;
   TTargetDetachResult Detached;
-  const std::string Line =
-      BuildCommand(Token, [](TGDBCommand& Builder, std::string& Key) { return Builder.CreateTargetDetachCommand(Key); });
-  ProcessSyncRequest(Token, Line, Detached);
-  if (Detached.FError || !Detached.FAvailable) {
+  if (!FRequests.Ask(Detached, &TGDBCommand::CreateTargetDetachCommand)) {
     // Still attached: requests wait as long as before.
-    FSyncRequestTimeout = FWaitPolicy.RunningTimeoutMs;
+    FRequests.SetSyncTimeout(WaitPolicy().RunningTimeoutMs);
     return;
   }
   NotifyProcessExited(0, "");
@@ -247,11 +132,7 @@ void TGDBProcess::SetOsException(const std::string& Signal, bool Stop, bool Pass
   }
   if (FKernel->IsWindows())
     return;
-  const bool LLDB = FKernel->IsLLDB();
-  std::string Key;
-  ProcessAsyncRequest(BuildCommand(Key, [&](TGDBCommand& Builder, std::string& Echo) {
-    return Builder.CreateCLHandleCommand(Echo, Signal, Stop, Pass, LLDB);
-  }));
+  FRequests.Fire(&TGDBCommand::CreateCLHandleCommand, Signal, Stop, Pass, FKernel->IsLLDB());
 }
 
 } // namespace midebug
