@@ -2,7 +2,7 @@
 # Installs what building and testing midebug needs on Debian 12, when missing.
 set -euo pipefail
 
-packages=(cmake ninja-build g++ clang libclang-rt-14-dev gdb fpc libgtest-dev libgmock-dev libbenchmark-dev nlohmann-json3-dev)
+packages=(cmake ninja-build g++ clang libclang-rt-14-dev gdb fpc libgtest-dev libgmock-dev libbenchmark-dev nlohmann-json3-dev pkg-config)
 missing=()
 for package in "${packages[@]}"; do
   dpkg-query -W -f='${Status}' "$package" 2>/dev/null | grep -q "install ok installed" || missing+=("$package")
