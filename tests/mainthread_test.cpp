@@ -17,19 +17,6 @@ using namespace std::chrono_literals;
 /// Long enough never to expire on a sound run; a hang shows as a failure.
 constexpr auto GenerousWait = 30s;
 
-TEST(MainThreadQueue, RunsQueuedDeliveriesInOrderAndOnlyOnce) {
-  TMainThreadQueue Queue;
-  Queue.SetMainThread();
-  std::vector<int> Order;
-  for (int Index = 0; Index < 5; ++Index)
-    Queue.Post([&Order, Index] { Order.push_back(Index); });
-  EXPECT_TRUE(Order.empty());
-  EXPECT_EQ(Queue.ProcessPending(), 5u);
-  EXPECT_EQ(Order, (std::vector<int>{0, 1, 2, 3, 4}));
-  EXPECT_EQ(Queue.ProcessPending(), 0u);
-  EXPECT_EQ(Order.size(), 5u);
-}
-
 TEST(MainThreadQueue, DeliverRunsAtOnceOnTheMainThreadAndQueuesElsewhere) {
   TMainThreadQueue Queue;
   Queue.SetMainThread();

