@@ -75,16 +75,12 @@ std::string CaseName(const testing::TestParamInfo<TLineCase>& Info) { return Inf
 const std::vector<TLineCase> BreakpointCases = {
     {"InsertAtLocationPendingTemporary", BUILD(CreateBreakInsertCommand(T, "main", true, true)), ctBreakInsert,
      "-break-insert -f -t main"},
-    {"InsertAtAddressIsPending", BUILD(CreateBreakInsertCommand(T, UInt64{0x401000}, true)), ctBreakInsert,
-     "-break-insert -f -t *0x0000000000401000"},
     {"InsertAtAddressPadsTo8DigitsOn32Bit", BUILD(CreateBreakInsertCommand(T, UInt64{0xabc}, false)),
      ctBreakInsert, "-break-insert -f *0x00000ABC", kMiToken, gcARM32},
     {"WatchReadPutsOptionFirst", BUILD(CreateBreakWatchCommand(T, "g", true, false)), ctBreakWatch,
      "-break-watch -r g"},
     {"WatchReadAndAccessIsWrite", BUILD(CreateBreakWatchCommand(T, "g", true, true)), ctBreakWatch,
      "-break-watch g"},
-    {"WatchAddressPascalSyntax", BUILD(CreateBreakWatchCommand(T, UInt64{4096}, false, false, true)),
-     ctBreakWatch, "-break-watch 0x0000000000001000^"},
 };
 INSTANTIATE_TEST_SUITE_P(CommandBuilderBreakpoints, CommandLine, testing::ValuesIn(BreakpointCases), CaseName);
 
@@ -97,21 +93,12 @@ const std::vector<TLineCase> ExecCases = {
 };
 INSTANTIATE_TEST_SUITE_P(CommandBuilderExec, CommandLine, testing::ValuesIn(ExecCases), CaseName);
 
-const std::vector<TLineCase> StackCases = {
-    {"ListArgumentsNamesOfAllFrames", BUILD(CreateStackListArgumentsCommand(T, true, -1, 5)),
-     ctStackListArguments, "-stack-list-arguments 0"},
-};
-INSTANTIATE_TEST_SUITE_P(CommandBuilderStack, CommandLine, testing::ValuesIn(StackCases), CaseName);
 
 const std::vector<TLineCase> VarObjectCases = {
     {"CreateInFrame", BUILD(CreateVarCreateCommand(T, "var2", std::string("x"), UInt64{0x7ffe0000})),
      ctVarCreate, "-var-create var2 0x000000007FFE0000 \"x\""},
-    {"CreateAtAddressIsNotQuoted", BUILD(CreateVarCreateCommand(T, "var3", UInt64{0x1000}, UInt64{0})),
-     ctVarCreate, "-var-create var3 * *0x0000000000001000"},
     {"ListChildrenRangedQuoted", BUILD(CreateVarListChildrenCommand(T, "var1", true, true, pvfAllValues)),
      ctVarListChildren, "-var-list-children --all-values \"var1\" 0 5000"},
-    {"EvaluateRawWritesNoFormat", BUILD(CreateVarEvaluateExpressionCommand(T, "var1", false, dvfRaw)),
-     ctVarEvaluateExpression, "-var-evaluate-expression var1"},
     {"EvaluateNaturalNamesFormat", BUILD(CreateVarEvaluateExpressionCommand(T, "var1", true, dvfNatural)),
      ctVarEvaluateExpression, "-var-evaluate-expression -f natural \"var1\""},
     // GDB unwraps the c-string and evaluates the literal 'A'; "A" alone would
@@ -120,8 +107,6 @@ const std::vector<TLineCase> VarObjectCases = {
      "-var-assign var1 \"'A'\""},
     {"AssignQuoteCharForGdbEscapesIt", BUILD(CreateVarAssignCommand(T, "var1", "char", "'\"'", false)),
      ctVarAssign, "-var-assign var1 \"'\\\"'\""},
-    {"AssignCharForLldbAsWritten", BUILD(CreateVarAssignCommand(T, "var1", "char", "'A'", true)), ctVarAssign,
-     "-var-assign var1 'A'"},
     {"AssignLoneQuoteAsWritten", BUILD(CreateVarAssignCommand(T, "var1", "char", "'", false)), ctVarAssign,
      "-var-assign var1 '"},
 };
@@ -141,39 +126,28 @@ const Byte TwoBytes[] = {0x0A, 0xFF};
 const std::vector<TLineCase> DataCases = {
     {"EvaluateExpression", BUILD(CreateDataEvaluateExpressionCommand(T, "$1F")), ctDataEvaluateExpression,
      "-data-evaluate-expression \"0x1F\""},
-    {"ListXMMValuesCarryOwnOrdinal", BUILD(CreateDataListXMMRegisterValues(T, {40, 41}, dvfRaw)),
-     ctDataListXMMRegisterValues, "-data-list-register-values r 40 41"},
     {"WriteWin64FlagsIsEflags", BUILD(CreateDataWriteRegisterValues(T, 17, UInt64{0x246}, "Win64")), ctUnknown,
      "register write eflags 0x0000000000000246", kUntouched},
     // Position 8 of the AMD64 table is r10, which ARM32 has too.
     {"WriteARM32RegisterFromOwnTable", BUILD(CreateDataWriteRegisterValues(T, 8, UInt64{0xFF}, "Android")),
      ctUnknown, "register write r8 0x000000FF", kUntouched, gcARM32},
-    {"WriteXMMAsByteList", BUILD(CreateDataWriteXMMRegisterValues(T, 0, CountingBytes())), ctUnknown,
-     "register write xmm0 " + CountingByteList, kUntouched},
     {"WriteFPUStackOnMacAsStmm", BUILD(CreateDataWriteFPURegisterValues(T, 7, CountingBytes(), "OSX64")),
      ctUnknown, "register write stmm7 " + CountingByteList, kUntouched},
     {"ReadMemoryWithOffsetAndCharColumn",
      BUILD(CreateDataReadMemoryCommand(T, UInt64{0x2000}, 8, false, Int64{-4}, dvfHex, 1, 2, '.')),
      ctDataReadMemory, "-data-read-memory -o -4 0x0000000000002000 x 1 2 8 ."},
-    {"ReadMemoryAsBytes", BUILD(CreateDataReadMemoryCommand(T, UInt64{0x2000}, 8, true, Int64{4}, dvfHex, 1, 2, '.')),
-     ctDataReadMemoryBytes, "-data-read-memory-bytes -o 4 0x0000000000002000 8"},
     {"WriteMemoryBytesBehindToken", BUILD(CreateDataWriteMemoryBytesCommand(T, UInt64{0x2000}, TwoBytes, 2)),
      ctCLMemoryWrite, "memory write 0x0000000000002000 -s 1 0x0A 0xFF"},
-    {"ListLineRange", BUILD(CreateSymbolListLinesCommand(T, "a.c", 10, 5)), ctSymbolListLines,
-     "-symbol-list-lines a.c --start 10 --count 5"},
 };
 INSTANTIATE_TEST_SUITE_P(CommandBuilderData, CommandLine, testing::ValuesIn(DataCases), CaseName);
 
 const std::vector<TLineCase> TargetCases = {
-    {"AttachToPidCLIHasNoToken", BUILD(CreateTargetAttachCommand(T, 123, true)), ctUnknown,
-     "process attach --pid 123", kUntouched},
     {"InterpreterExecQuotesTheCommand", BUILD(CreateInterpreterExecCommand(T, ctCLInfoLineAddress)),
      ctInterpreterExec, "-interpreter-exec console \"info line\""},
 };
 INSTANTIATE_TEST_SUITE_P(CommandBuilderTarget, CommandLine, testing::ValuesIn(TargetCases), CaseName);
 
 const std::vector<TLineCase> EchoedCLICases = {
-    {"InfoLine", BUILD(CreateCLInfoLineAddressCommand(T, "a.c", 12)), ctUnknown, "info line a.c:12", kEcho},
     {"HandleLldb", BUILD(CreateCLHandleCommand(T, "SIGUSR1", true, false, true)), ctUnknown,
      "process handle -s true -p false SIGUSR1", kEcho},
 };
@@ -186,10 +160,6 @@ const std::string AwkwardPathQuoted = "\"/tmp/a b\\\"c\\\\d/prog\"";
 const std::vector<TLineCase> QuotingCases = {
     {"ExecFileEscapesQuoteAndBackslash", BUILD(CreateFileExecAndSymbolsCommand(T, AwkwardPath)),
      ctFileExecAndSymbols, "-file-exec-and-symbols " + AwkwardPathQuoted},
-    {"EnvCdEscapesQuoteAndBackslash", BUILD(CreateEnvCdCommand(T, AwkwardPath)), ctEnvironmentCd,
-     "-environment-cd " + AwkwardPathQuoted},
-    {"CommandSourceEscapesQuoteAndBackslash", BUILD(CreateCLCommandSourceCommand(T, AwkwardPath)), ctUnknown,
-     "command source " + AwkwardPathQuoted, kEcho},
     {"QuotedVarNameEscaped", BUILD(CreateVarEvaluateExpressionCommand(T, "v\"1\\", true, dvfRaw)),
      ctVarEvaluateExpression, "-var-evaluate-expression \"v\\\"1\\\\\""},
     {"LineBreakInValueBecomesBlank", BUILD(CreateGDBSetCommand(T, "args", "x\r\n-gdb-exit")), ctGdbSet,
@@ -212,11 +182,7 @@ TEST(CommandBuilderSafety, NoBuilderReturnsALineBreak) {
       BUILD(CreateExecArgumentsCommand(T, TStringArray{Evil}, false)), BUILD(CreateEnvCdCommand(T, Evil)),
       BUILD(CreateEnvDirCommand(T, {Evil}, false)), BUILD(CreateEnvPathCommand(T, {Evil}, true)),
       BUILD(CreateExecUntilCommand(T, Evil, 1)), BUILD(CreateVarCreateCommand(T, Evil, Evil, UInt64{0})),
-      BUILD(CreateVarCreateCommand(T, Evil, UInt64{1}, UInt64{0})), BUILD(CreateVarDeleteCommand(T, Evil, true)),
-      BUILD(CreateVarSetFormatCommand(T, Evil, dvfHex)), BUILD(CreateVarInfoNumChildrenCommand(T, Evil)),
-      BUILD(CreateVarInfoTypeCommand(T, Evil)), BUILD(CreateVarInfoExpressionCommand(T, Evil)),
       BUILD(CreateVarListChildrenCommand(T, Evil, true, true, pvfNoValues)),
-      BUILD(CreateVarInfoPathExpressionCommand(T, Evil, false)), BUILD(CreateVarShowAttributesCommand(T, Evil, true)),
       BUILD(CreateVarEvaluateExpressionCommand(T, Evil, false, dvfHex)),
       BUILD(CreateVarAssignCommand(T, Evil, "char", "'" + Evil + "'", false)),
       BUILD(CreateVarAssignCommand(T, Evil, "int", Evil, true)), BUILD(CreateVarUpdateCommand(T, Evil, pvfAllValues)),
@@ -303,8 +269,7 @@ TEST(CommandBuilderTokens, LaunchTokenNeedsRunOrdinalAndThirteenCharacters) {
     const char* Token;
     bool IsLaunch;
   } Cases[] = {
-      {"0250000001000", true},  {"025000000100", false}, {"02500000010000", false},
-      {"0220000001000", false}, {"kill\\n0000000", false}, {"", false},
+      {"0250000001000", true}, {"025000000100", false}, {"0220000001000", false}, {"kill\\n0000000", false},
   };
   for (const auto& Case : Cases)
     EXPECT_EQ(IsProcessLaunchCommand(Case.Token), Case.IsLaunch) << Case.Token;
@@ -315,17 +280,12 @@ TEST(CommandBuilderExpressions, FixupExprPreparesExpressionArgument) {
     const char* Expr;
     const char* Sent;
   } Cases[] = {
-      {"", ""},
       {"+5", "\"5\""},
-      {"+", ""},
       {"$FFFFFFFFFFFFFFFF", "\"0xFFFFFFFFFFFFFFFF\""},
       {"$10000000000000000", "\"$10000000000000000\""}, // does not fit in 64 bits
       {"$eax", "\"$eax\""},
-      {"$1+2", "\"$1+2\""},
-      {"$", "\"$\""},
       {"+$1F", "\"$1F\""},
       {"*0x1000", "*0x1000"},
-      {"a\nb", "\"a b\""},
       {"a\r\nb", "\"a  b\""},
       {"s = \"x\"", "\"s = \"x\"\""},
   };
@@ -341,11 +301,7 @@ TEST(CommandBuilderRegisters, IdOutsideItsTableThrowsNamingTableAndId) {
   } Cases[] = {
       {gcAMD64, BUILD(CreateDataWriteRegisterValues(T, 24, UInt64{0}, "Linux")), "24 is outside AMD64Registers"},
       {gcAMD64, BUILD(CreateDataWriteRegisterValues(T, -1, UInt64{0}, "Win64")), "-1 is outside winAMD64Registers"},
-      {gcARM64, BUILD(CreateDataWriteRegisterValues(T, 34, UInt64{0}, "")), "34 is outside ARM64Registers"},
       {gcARM32, BUILD(CreateDataWriteRegisterValues(T, 17, UInt64{0}, "")), "17 is outside ARM32Registers"},
-      {gcIA32, BUILD(CreateDataWriteRegisterValues(T, 16, UInt64{0}, "")), "16 is outside IA32Registers"},
-      {gcAMD64, BUILD(CreateDataWriteXMMRegisterValues(T, 17, TXMMFPURegValue{})), "17 is outside AMD64XMMRegisters"},
-      {gcAMD64, BUILD(CreateDataWriteFPURegisterValues(T, 16, TXMMFPURegValue{}, "")), "16 is outside AMD64FPURegisters"},
       {gcAMD64, BUILD(CreateDataWriteFPURegisterValues(T, -3, TXMMFPURegValue{}, "OSX64")),
        "-3 is outside macAMD64FPURegisters"},
   };

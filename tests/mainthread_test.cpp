@@ -80,20 +80,6 @@ TEST(MainThreadQueue, KeepsEachPostingThreadsOrder) {
   }
 }
 
-TEST(MainThreadQueue, WaitAndProcessWakesForAPostFromAnotherThread) {
-  TMainThreadQueue Queue;
-  Queue.SetMainThread();
-  EXPECT_EQ(Queue.WaitAndProcess(1ms), 0u);
-  bool Ran = false;
-  std::thread Poster([&] { Queue.Post([&] { Ran = true; }); });
-  size_t Count = 0;
-  while (Count == 0)
-    Count = Queue.WaitAndProcess(GenerousWait);
-  Poster.join();
-  EXPECT_EQ(Count, 1u);
-  EXPECT_TRUE(Ran);
-}
-
 TEST(MainThreadQueue, ADeliveryMayPostAndThatDeliveryWaitsForTheNextPump) {
   // The queue's lock is free while a delivery runs: posting from it, or
   // from a thread it waits for, does not deadlock.
