@@ -12,7 +12,6 @@
 #include <filesystem>
 #include <fstream>
 #include <functional>
-#include <set>
 #include <sstream>
 #include <string>
 #include <signal.h>
@@ -223,32 +222,6 @@ TEST_F(CliTest, CliRunPauseInterruptsAProgramThatNeverStopsAndKillEndsIt) {
   const std::vector<std::string> Expected = {"event:loaded", "answer:run",  "event:stopped", "answer:pause",
                                              "event:exited", "answer:kill"};
   EXPECT_EQ(Run.Sequence(), Expected) << Run.Stdout;
-}
-
-TEST_F(CliTest, CliRunReportsThreadsThatStartAndEndAfterTheStartStop) {
-  const std::string Program = Debuggee("workers");
-  // Threads are followed once the program has stopped at its start.
-  const TCliRun Run = RunCli(Quote(Program), "start\ncontinue\n");
-  std::set<int> Created;
-  std::set<int> Exited;
-  for (const json& Line : Run.Lines) {
-    if (Line.value("event", "") == "thread-created")
-      Created.insert(Line["thread"].get<int>());
-    if (Line.value("event", "") == "thread-exited")
-      Exited.insert(Line["thread"].get<int>());
-  }
-  // The main thread and at least the two workers, whose numbers GDB picks;
-  // every worker that appeared also ended.
-  EXPECT_TRUE(Created.contains(1)) << Run.Stdout;
-  EXPECT_GE(Created.size(), 3u) << Run.Stdout;
-  const json* StartAnswer = Run.Answer("start");
-  ASSERT_NE(StartAnswer, nullptr);
-  EXPECT_EQ((*StartAnswer)["state"], "stopped");
-  for (const int Thread : Created)
-    EXPECT_TRUE(Thread == 1 || Exited.contains(Thread)) << "thread " << Thread << "\n" << Run.Stdout;
-  const json* ExitedEvent = Run.Event("exited");
-  ASSERT_NE(ExitedEvent, nullptr) << Run.Stdout;
-  EXPECT_EQ((*ExitedEvent)["code"], 6);
 }
 
 TEST_F(CliTest, CliAttachShowsTheStackAndDetachLeavesTheProgramRunning) {

@@ -180,26 +180,5 @@ TEST(IntfRefCount, CopiesAndMovesShareOneObjectDeletedOnce) {
   EXPECT_EQ(Deleted, 1);
 }
 
-TEST(IntfRefCount, CountsStayExactUnderConcurrentCopies) {
-  std::atomic<int> Deleted{0};
-  TIntfPtr<ITestProbe> Shared = new TProbe(Deleted);
-  constexpr int ThreadCount = 4;
-  constexpr int Rounds = 100000;
-  std::vector<std::thread> Threads;
-  for (int Index = 0; Index < ThreadCount; ++Index)
-    Threads.emplace_back([&Shared] {
-      for (int Round = 0; Round < Rounds; ++Round) {
-        TIntfPtr<ITestProbe> Copy = Shared;
-        TIntfPtr<ITestOther> Other = QueryIntf<ITestOther>(Copy);
-      }
-    });
-  for (std::thread& Each : Threads)
-    Each.join();
-  EXPECT_EQ(static_cast<TProbe*>(Shared.get())->RefCount(), 1);
-  EXPECT_EQ(Deleted, 0);
-  Shared = nullptr;
-  EXPECT_EQ(Deleted, 1);
-}
-
 } // namespace
 } // namespace midebug

@@ -96,49 +96,6 @@ TEST(LocalAgentWithGdb, InterruptsAndKillsTheDebuggee) {
   EXPECT_NE(ReplyContaining(*Kernel, "*stopped").find("exited-signalled"), std::string::npos);
 }
 
-TEST(LocalAgentChannels, StopReleasesAReaderWaitingOnTheOtherChannel) {
-  TLocalAgentClient Reader;
-  TLocalAgentClient Writer;
-  Reader.Connect(nullptr);
-  Writer.Connect(nullptr);
-  Integer Id = 0;
-  Int64 EntryPoint = -1;
-  Int64 Capabilities = 0;
-  std::string InitFile;
-  ASSERT_TRUE(Writer.GDBStart("gdb", 0, ktGDB, Id, EntryPoint, Capabilities, InitFile)) << Writer.GetLastError();
-  EXPECT_EQ(EntryPoint, 0);
-  std::string Greeting;
-  ASSERT_TRUE(Reader.GDBGetReply(Id, Greeting)) << Reader.GetLastError();
-
-  // GDB prints nothing more until asked: the reader waits until the stop.
-  bool ReadResult = true;
-  std::thread Waiting([&] {
-    std::string Reply;
-    ReadResult = Reader.GDBGetReply(Id, Reply);
-  });
-  Writer.GDBStop(Id);
-  Waiting.join();
-  EXPECT_FALSE(ReadResult);
-  EXPECT_NE(Reader.GetLastError(), "");
-  EXPECT_FALSE(Writer.GDBSendRequest(Id, "1-gdb-version"));
-  EXPECT_EQ(Writer.GetLastError(), "no debugger instance " + std::to_string(Id));
-}
-
-TEST(LocalAgentChannels, LogGoesIntoTheDebuggersTrafficLog) {
-  TScratchDir LogDir;
-  TScopedEnv Debug("GDB_DEBUG", "1");
-  TScopedEnv OutDir("GDB_OUTDIR", LogDir.Path());
-  {
-    auto Kernel = StartLocalGdb();
-    Kernel->Log("a line the process wrote", true);
-  }
-  std::string Log;
-  for (const auto& Entry : std::filesystem::directory_iterator(LogDir.Path()))
-    Log += test::ReadWholeFile(Entry.path());
-  EXPECT_NE(Log.find("=thread-group-added"), std::string::npos) << Log;
-  EXPECT_NE(Log.find("a line the process wrote\n"), std::string::npos) << Log;
-}
-
 TEST(LocalAgentChannels, MissingDebuggerIsNamedByTheWriteChannel) {
   TGDBRemoteKernel Kernel(LocalProfileName, "/no/such/dir/gdb", 0);
   EXPECT_FALSE(Kernel.Start());

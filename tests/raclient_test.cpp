@@ -138,11 +138,6 @@ TEST(LocalMethodsText, GetTokenSkipsBlanksAndTabs) {
     EXPECT_EQ(TLocalMethodsClient::GetToken(Text), Case.Token) << ::testing::PrintToString(Case.Text);
     EXPECT_EQ(Text, Case.Rest) << ::testing::PrintToString(Case.Text);
   }
-
-  std::string Line = "shell      1234     1 12345678  9876 do_sys_poll 0 S lldb-server";
-  TLocalMethodsClient::GetToken(Line);
-  EXPECT_EQ(TLocalMethodsClient::GetToken(Line), "1234");
-  EXPECT_EQ(TLocalMethodsClient::GetToken(Line), "1");
 }
 
 TEST(LocalMethodsAndroidInfo, EnvironmentOverridesEachSetting) {

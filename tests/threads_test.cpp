@@ -129,7 +129,7 @@ TEST_F(ThreadsInC, StoppedThreadShowsItsCallsWithNamedArgumentsInnermostFirst) {
   EXPECT_EQ(Worker->GetCallCount(), Count) << "the count after the fetch is the number of frames fetched";
 }
 
-TEST_F(ThreadsInC, FrameNumbersOutsideTheStackGiveEmptyValues) {
+TEST_F(ThreadsInC, FramesOutsideTheStackGiveEmptyValuesAndCannotBeSelected) {
   const Integer Count = Worker->GetCallCount();
   for (const Integer Index : {0, -1, Count + 1, 10000}) {
     EXPECT_EQ(Worker->GetCallHeader(Index), "") << Index;
@@ -137,6 +137,14 @@ TEST_F(ThreadsInC, FrameNumbersOutsideTheStackGiveEmptyValues) {
     EXPECT_TRUE(Of(Worker).GetCallParams(Index).empty()) << Index;
   }
   EXPECT_NE(Worker->GetCallHeader(Count), "");
+
+  // Selecting a frame outside the stack changes nothing.
+  Of(Worker).SelectFrame(2);
+  for (const Integer Frame : {0, -3, Count + 1}) {
+    Of(Worker).SelectFrame(Frame);
+    EXPECT_EQ(Of(Worker).FFrameIndex, 1) << Frame;
+  }
+  EXPECT_EQ(Core().GetCurrentLocation().Line, 5) << "still in outer";
 }
 
 TEST_F(ThreadsInC, AnotherThreadsStackIsItsOwnAndSelectingItMovesTheDebugger) {
@@ -174,17 +182,6 @@ TEST_F(ThreadsInC, SelectedFrameIsWhereTheDebuggerActsUntilTheThreadIsSelectedAg
       << "back at the innermost frame in the debugger";
 }
 
-TEST_F(ThreadsInC, FrameSelectionOutsideTheStackChangesNothing) {
-  const Integer Count = Worker->GetCallCount();
-  Of(Worker).SelectFrame(2);
-  ASSERT_EQ(Of(Worker).FFrameIndex, 1);
-  for (const Integer Frame : {0, -3, Count + 1}) {
-    Of(Worker).SelectFrame(Frame);
-    EXPECT_EQ(Of(Worker).FFrameIndex, 1) << Frame;
-  }
-  EXPECT_EQ(Core().GetCurrentLocation().Line, 5) << "still in outer";
-}
-
 TEST_F(ThreadsInC, UnknownThreadNumbersGiveTheZombieWhichHasNoStack) {
   const TIntfPtr<IGDBThread> Unknown = Process->GetThread(99);
   EXPECT_EQ(Unknown->GetState(), tsZombie);
@@ -204,12 +201,6 @@ TEST_F(ThreadsInC, SelectingAThreadTheDebuggerDoesNotKnowChangesNothing) {
   Core().SetSuspendedThread(2);
   EXPECT_EQ(Process->GetSuspendedThreadId(), 2);
   EXPECT_EQ(Worker->GetCurrentLocation().Line, 4);
-}
-
-TEST_F(ThreadsInC, ThreadsKnowTheirNamesAndStatesAtAStop) {
-  EXPECT_EQ(MainThread->GetState(), tsStop);
-  EXPECT_EQ(Worker->GetState(), tsStop);
-  EXPECT_NE(MainThread->GetName(), "");
 }
 
 TEST_F(ThreadsInC, SteppingAThreadStepsThatThreadEvenWhenAnotherIsCurrent) {

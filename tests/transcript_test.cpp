@@ -263,24 +263,6 @@ TEST(TranscriptEvents, SignalTextGluedToProgramOutputNeitherLostNorFatal) {
   EXPECT_FALSE(Replay.Process.Called("Faulted"));
 }
 
-TEST(TranscriptEvents, CommandsWithoutPayloadCompleteWithoutError) {
-  TTranscriptReplay Replay;
-  auto& Load = Replay.Expect<TFileExecAndSymbolsResult>("0730000000001");
-  auto& Run = Replay.Expect<TExecRunResult>("0250000000004");
-  auto& Delete = Replay.Expect<TGDBResult>("0030000000037", ctBreakDelete);
-  auto& Exit = Replay.Expect<TGDBResult>("0940000000039", ctGdbExit);
-  Replay.Replay("stops");
-
-  EXPECT_TRUE(IsEntered(Load));
-  EXPECT_TRUE(IsEntered(Run));
-  EXPECT_TRUE(IsEntered(Delete));
-  EXPECT_TRUE(IsEntered(Exit));
-  EXPECT_TRUE(Replay.Process.WaitObjects.empty()) << "every registered command was answered";
-  // The "^running" of -exec-run, five -exec-next, four -exec-continue and
-  // -exec-finish.
-  EXPECT_EQ(Replay.Process.Resumptions, 11);
-}
-
 // ---------------------------------------------------------------------------
 // Result decoders
 
@@ -294,22 +276,6 @@ TEST(TranscriptDecoders, BreakInsertResolvingToSeveralLocations) {
   EXPECT_TRUE(IsEntered(Twice));
   EXPECT_EQ(Twice.FBreakpoint, 1);
   EXPECT_TRUE(IsAt(Twice.FLocation, "templates.cpp", 7));
-}
-
-TEST(TranscriptDecoders, BreakWatchForWriteAndReadWatchpoints) {
-  TTranscriptReplay Replay;
-  auto& Counter = Replay.Expect<TBreakWatchResult>("0090000000031");
-  auto& Doubled = Replay.Expect<TBreakWatchResult>("0090000000032");
-  auto& Sensor = Replay.Expect<TBreakWatchResult>("0090000000033");
-  Replay.Replay("stops");
-
-  EXPECT_TRUE(IsEntered(Counter));
-  EXPECT_EQ(Counter.FBreakpoint, 3);
-  EXPECT_TRUE(IsEntered(Doubled));
-  EXPECT_EQ(Doubled.FBreakpoint, 4);
-  // GDB 13 answers a read watchpoint with "hw-rwpt" instead of "wpt".
-  EXPECT_TRUE(IsEntered(Sensor));
-  EXPECT_EQ(Sensor.FBreakpoint, 5);
 }
 
 TEST(TranscriptDecoders, StackFramesThroughLibrariesAndOtherLanguages) {
