@@ -1,41 +1,31 @@
 /// \file
 /// fakemidebugger: a scripted stand-in for a debugger's MI front end (GDB or
-/// lldb-mi). It shows on demand what a real debugger cannot be made to show:
-/// exact byte layouts, replies split across writes, invalid UTF-8, sudden
-/// exit, hangs. Arguments are ignored (`print-args` reports them).
+/// lldb-mi), for what a real debugger cannot be made to show: exact byte
+/// layouts, replies split across writes, invalid UTF-8, sudden exit, hangs.
 ///
-/// The script is the file named by FAKEMI_SCRIPT. It is read whole before
-/// anything runs, so a faulty script prints only a diagnostic naming its line
-/// (exit code 2). One directive per line; blank lines and lines starting
-/// with `#` are ignored; the argument is the rest of the line after the first
-/// blank. TEXT arguments decode `\n` `\r` `\t` `\\` `\s` (blank) and `\xHH`;
-/// in expect, expect-prefix, skip-to, send and sendraw, `{TOKEN}` stands for
-/// the MI token (a run of digits bound by the last expectation that had one).
+/// It plays the script named by FAKEMI_SCRIPT, read whole first so that a
+/// faulty script prints only a diagnostic naming its line (exit code 2).
+/// One directive per line; blank lines and lines starting with `#` are
+/// ignored. TEXT decodes `\n` `\r` `\t` `\\` `\s` (blank) and `\xHH`; in
+/// expect, expect-prefix, skip-to, send and sendraw `{TOKEN}` is the MI token
+/// (the digits bound by the last expectation that had one).
 ///
-///   include FILE       Run FILE, a path relative to this script's directory.
-///   expect TEXT        Read one line; it must equal TEXT (`*`: any line).
-///   expect-prefix TEXT Read one line; it must start with TEXT.
-///   skip-to TEXT       Read lines until one starts with TEXT.
-///       A mismatch or end of input prints `fakemi: expected ...` on stderr
-///       and exits with code 3.
-///   send TEXT          Write TEXT and LF in one write(2).
-///   sendraw TEXT       Write TEXT, no LF.
-///   prompt             Write the prompt (`(gdb) ` LF unless set-prompt).
-///   set-prompt TEXT    Change the prompt.
-///   sendfill N C       Write N bytes of the byte C in one write(2).
-///   sleep MS           Sleep MS milliseconds.
-///   print-args         Write the arguments joined by blanks, then LF.
-///   print-cwd          Write the working directory, then LF.
-///   exit CODE          Exit at once with CODE.
-///   hang               Sleep until killed.
-///   close-output       Close stdout and stderr and go on.
-///   wait-eof           Read and discard stdin up to end of file.
-///   serve              Until end of input answer `<digits>-gdb-exit` with
-///                      `<digits>^exit` (then exit 0), `<digits>...` with
-///                      `<digits>^done` and the prompt, anything else with
-///                      the prompt.
-/// At the end of the script the program exits with code 0; with code 4 once
-/// the reader of stdout has gone.
+///   include FILE       FILE's directives, a path relative to this script
+///   expect TEXT        the next line equals TEXT (`*`: any line)
+///   expect-prefix TEXT the next line starts with TEXT
+///   skip-to TEXT       read lines until one starts with TEXT
+///                      (a mismatch or end of input: exit code 3)
+///   send TEXT          write TEXT and LF in one write(2); sendraw: no LF
+///   prompt             write the prompt, `(gdb) ` LF unless set-prompt TEXT
+///   sendfill N C       write N bytes C in one write(2)
+///   sleep MS, exit CODE, hang (until killed)
+///   print-args, print-cwd   write the arguments or the working directory
+///   close-output       close stdout and stderr and go on
+///   wait-eof           read stdin to its end
+///   serve              answer `<digits>-gdb-exit` with `<digits>^exit` and
+///                      exit, `<digits>...` with `<digits>^done` and the
+///                      prompt, anything else with the prompt
+/// Exit code 0 at the end of the script, 4 once stdout's reader has gone.
 
 #include <cctype>
 #include <cerrno>

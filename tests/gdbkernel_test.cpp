@@ -12,7 +12,6 @@
 #include <filesystem>
 #include <fstream>
 #include <sstream>
-#include <sys/stat.h>
 
 namespace midebug {
 namespace {
@@ -104,15 +103,6 @@ TEST(KernelStartFailure, MissingProgramIsNamed) {
   std::string Reply;
   EXPECT_FALSE(Kernel.GetReply(Reply));
   EXPECT_EQ(Kernel.GetLastError(true), "process exited");
-}
-
-TEST(KernelStartFailure, ProgramThatCannotRunGivesTheSystemsReason) {
-  TScratchDir Scratch;
-  const std::string NotExecutable = Scratch.WriteFile("gdb", "not a program");
-  chmod(NotExecutable.c_str(), 0644);
-  TGDBKernel Kernel(NotExecutable, "");
-  EXPECT_FALSE(Kernel.Start());
-  EXPECT_EQ(Kernel.GetLastError(false), "Unable to create process: Permission denied");
 }
 
 TEST_F(FakeDebuggerTest, RepliesOfAndBeyondTheBufferSizeArriveWhole) {

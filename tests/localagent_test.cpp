@@ -11,7 +11,6 @@
 #include <gtest/gtest.h>
 
 #include <filesystem>
-#include <thread>
 
 namespace midebug {
 namespace {
@@ -94,14 +93,6 @@ TEST(LocalAgentWithGdb, InterruptsAndKillsTheDebuggee) {
   Kernel->Terminate(Pid);
   ASSERT_TRUE(Kernel->SendRequest("4-exec-continue"));
   EXPECT_NE(ReplyContaining(*Kernel, "*stopped").find("exited-signalled"), std::string::npos);
-}
-
-TEST(LocalAgentChannels, MissingDebuggerIsNamedByTheWriteChannel) {
-  TGDBRemoteKernel Kernel(LocalProfileName, "/no/such/dir/gdb", 0);
-  EXPECT_FALSE(Kernel.Start());
-  EXPECT_EQ(Kernel.GetLastError(false), "Could not find program, '/no/such/dir/gdb'");
-  std::string Reply;
-  EXPECT_FALSE(Kernel.GetReply(Reply));
 }
 
 TEST(LocalAgentWithLldbMi, StartsTheFrontEndFromPathAndReportsLldbCapabilities) {

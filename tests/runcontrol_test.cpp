@@ -113,6 +113,8 @@ struct TMainCase {
   Integer MainLine;
 };
 
+void PrintTo(const TMainCase& Case, std::ostream* Out) { *Out << Case.Program; }
+
 class RunControlToMain : public RunControl, public ::testing::WithParamInterface<TMainCase> {};
 
 TEST_P(RunControlToMain, StopsAtMainAsABreakpointStopAndLearnsTheLanguage) {
