@@ -57,6 +57,17 @@ TEST(PlatformText, IsValidUTF8AcceptsWellFormedAndRejectsMalformedSequences) {
     EXPECT_EQ(IsValidUTF8(Case.Bytes), Case.Valid) << Case.Name;
 }
 
+TEST(PlatformText, IsValidUTF8StopsAtTheEndOfAViewCutInsideASequence) {
+  // The bytes after the view's end would complete the sequence; they must not
+  // be read.
+  const std::string Whole = "x\xC3\xA9 x\xE2\x82\xAC x\xF0\x9F\x98\x80";
+  for (size_t Length = 0; Length <= Whole.size(); ++Length) {
+    const std::string_view Prefix = std::string_view(Whole).substr(0, Length);
+    const bool EndsInsideSequence = Length < Whole.size() && (static_cast<unsigned char>(Whole[Length]) & 0xC0) == 0x80;
+    EXPECT_EQ(IsValidUTF8(Prefix), !EndsInsideSequence) << "first " << Length << " bytes";
+  }
+}
+
 TEST(PlatformText, AnsiToUTF8ReadsWindows1252) {
   const std::pair<std::string, std::string> Cases[] = {
       {"\x81", "\xC2\x81"},                                 // undefined: the C1 control U+0081
@@ -220,6 +231,25 @@ TEST(PlatformPipe, WriteToPipeWithoutReaderFailsWithoutSignal) {
   EXPECT_EQ(errno, EPIPE);
   EXPECT_FALSE(SigPipeBlocked());
   EXPECT_FALSE(SigPipePending());
+}
+
+TEST(PlatformPipe, WriteWithSigPipeAlreadyBlockedLeavesTheSignalToTheCaller) {
+  sigset_t PipeSet;
+  sigset_t OldMask;
+  sigemptyset(&PipeSet);
+  sigaddset(&PipeSet, SIGPIPE);
+  pthread_sigmask(SIG_BLOCK, &PipeSet, &OldMask);
+  TPipe Pipe;
+  Pipe.CloseRead();
+  EXPECT_EQ(WriteHandle(Pipe.WriteHandle(), "x", 1), -1);
+  EXPECT_EQ(errno, EPIPE);
+  EXPECT_TRUE(SigPipeBlocked());
+  EXPECT_TRUE(SigPipePending());
+  // Collect it here: unblocking with the signal pending would end the test.
+  const timespec NoWait{0, 0};
+  while (sigtimedwait(&PipeSet, nullptr, &NoWait) == SIGPIPE) {
+  }
+  pthread_sigmask(SIG_SETMASK, &OldMask, nullptr);
 }
 
 // --- Log file --------------------------------------------------------------
