@@ -428,7 +428,7 @@ TEST_F(RunControlFake, ThreadBurstIsOneDeliveryLatestThreadFirst) {
   EXPECT_EQ(Calls.back(), "ThreadCreated(2)");
 }
 
-TEST_F(RunControlFake, StopsTheIdeDoesNotHearOfEndInTheExit) {
+TEST_F(RunControlFake, SilentStopsAndFaultsEndInTheExit) {
   const struct {
     const char* Script;
     const char* Exit;
