@@ -10,7 +10,9 @@
 
 #include <gtest/gtest.h>
 
-#include <regex>
+#include <algorithm>
+#include <cctype>
+#include <string_view>
 
 namespace midebug {
 namespace {
@@ -26,15 +28,30 @@ TEST(ThreadsState, StrToStateIgnoresLetterCaseAndGivesNoneForAnythingElse) {
     EXPECT_EQ(TGDBThread::StrToState(Text), State) << "'" << Text << "'";
 }
 
-/// A frame header of C and C++: the address in 16 upper-case digits, the
-/// function and its named arguments.
+/// Whether Text matches Pattern, where each '*' stands for any run of
+/// characters.
+bool Glob(std::string_view Text, std::string_view Pattern) {
+  const size_t Star = Pattern.find('*');
+  if (Star == std::string_view::npos)
+    return Text == Pattern;
+  if (!Text.starts_with(Pattern.substr(0, Star)))
+    return false;
+  for (size_t At = Star; At <= Text.size(); ++At)
+    if (Glob(Text.substr(At), Pattern.substr(Star + 1)))
+      return true;
+  return false;
+}
+
+/// A frame header with an address: ':', the address in 16 upper-case
+/// digits, a blank, then the call (a Glob pattern).
 ::testing::AssertionResult IsCHeader(const std::string& Header, const std::string& Call) {
-  static const std::regex Address("^:[0-9A-F]{16} ");
-  if (!std::regex_search(Header, Address))
-    return ::testing::AssertionFailure() << "'" << Header << "' does not start with :ADDRESS";
-  if (Header.substr(18) != Call)
-    return ::testing::AssertionFailure() << "'" << Header << "' does not end in '" << Call << "'";
-  return ::testing::AssertionSuccess();
+  const bool Address = Header.size() > 18 && Header[0] == ':' && Header[17] == ' ' &&
+                       std::all_of(Header.begin() + 1, Header.begin() + 17, [](char Digit) {
+                         return std::isdigit(static_cast<unsigned char>(Digit)) || (Digit >= 'A' && Digit <= 'F');
+                       });
+  if (Address && Glob(Header.substr(18), Call))
+    return ::testing::AssertionSuccess();
+  return ::testing::AssertionFailure() << "'" << Header << "' is not ':ADDRESS " << Call << "'";
 }
 
 UInt64 HeaderAddress(const std::string& Header) { return std::stoull(Header.substr(1, 16), nullptr, 16); }
@@ -152,8 +169,7 @@ TEST_F(ThreadsInC, AnotherThreadsStackIsItsOwnAndSelectingItMovesTheDebugger) {
   const Integer Main = FrameOf(MainThread, "main");
   ASSERT_GT(Main, 1) << "main waits in pthread_join";
   EXPECT_EQ(Process->GetSuspendedThreadId(), 1);
-  EXPECT_TRUE(IsCHeader(MainThread->GetCallHeader(Main), MainThread->GetCallHeader(Main).substr(18)));
-  EXPECT_TRUE(MainThread->GetCallHeader(Main).substr(18).starts_with("main(argc=1, argv=0x"));
+  EXPECT_TRUE(IsCHeader(MainThread->GetCallHeader(Main), "main(argc=1, argv=0x*)"));
   EXPECT_EQ(FrameOf(MainThread, "inner"), 0);
   EXPECT_EQ(MainThread->GetCallLocation(Main).Line, 12);
 
@@ -229,10 +245,8 @@ TEST_F(ThreadsTest, CppFramesShowQualifiedNamesAndEmptyParenthesesWithoutArgumen
 
   ASSERT_EQ(Thread->GetCallCount(), 3);
   const std::string Twice = Thread->GetCallHeader(1);
-  EXPECT_TRUE(std::regex_match(Twice, std::regex(":[0-9A-F]{16} Calc::twice\\(this=0x[0-9a-f]+, n=21\\)"))) << Twice;
-  EXPECT_TRUE(std::regex_match(Thread->GetCallHeader(2),
-                               std::regex(":[0-9A-F]{16} apply\\(c=@0x[0-9a-f]+: \\{base = 1\\}, n=21\\)")))
-      << Thread->GetCallHeader(2);
+  EXPECT_TRUE(IsCHeader(Twice, "Calc::twice(this=0x*, n=21)"));
+  EXPECT_TRUE(IsCHeader(Thread->GetCallHeader(2), "apply(c=@0x*: {base = 1}, n=21)"));
   EXPECT_TRUE(IsCHeader(Thread->GetCallHeader(3), "main()"));
   EXPECT_EQ(Thread->GetCallLocation(3).Line, 8);
 }
@@ -255,7 +269,7 @@ TEST_F(ThreadsTest, PascalFramesShowArgumentValuesAndAnAddressWhereSourceIsMissi
   EXPECT_EQ(Process->GetSuspendedThreadId(), 1);
   EXPECT_EQ(Thread->GetCallHeader(1), "BYE");
   const std::string Runtime = Thread->GetCallHeader(2);
-  EXPECT_TRUE(std::regex_match(Runtime, std::regex(":[0-9A-F]{16} SYSTEM_\\$\\$_DOEXITPROC"))) << Runtime;
+  EXPECT_TRUE(IsCHeader(Runtime, "SYSTEM_$$_DOEXITPROC"));
   EXPECT_EQ(HeaderAddress(Runtime), Thread->GetCallLocation(2).Address);
 }
 
