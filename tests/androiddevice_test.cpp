@@ -133,14 +133,6 @@ TEST(AndroidDeviceServerId, FoundInTheProcessList) {
        {PsLine("shell", "12ab", "lldb-server"), PsLine("shell", "1234", "lldb-server")},
        1234,
        2},
-      {"a later line in the same listing after a bad id",
-       {PsLine("shell", "pid", "lldb-server") + PsLine("shell", "1234", "lldb-server")},
-       1234,
-       1},
-      {"the first matching line wins",
-       {PsLine("shell", "1234", "lldb-server") + PsLine("shell", "5678", "lldb-server")},
-       1234,
-       1},
       {"lines ending in CR LF", {"root 1 0 100 10 0 0 S init\r\nshell 1234 1 100 10 0 0 S lldb-server\r\n"}, 1234, 1},
       {"tabs between the columns", {"shell\t1234\t1\t100\t10\t0\t0\tS lldb-server\n"}, 1234, 1},
   };
@@ -234,15 +226,6 @@ TEST(AndroidDeviceLifetime, ProcessListThatCannotRunFailsAndKillsNothing) {
   Device.reset();
   ServerEnder.join();
   EXPECT_FALSE(Bridge.KillsRecorded()) << ::testing::PrintToString(Bridge.Kills());
-}
-
-TEST(AndroidDeviceLifetime, DeviceWhoseServerNeverStartedRunsNoKill) {
-  const TFakeBridge Bridge;
-  Bridge.SetListings({PsLine("shell", "1234", "lldb-server")});
-  Bridge.SetServerDeviceId(1234);
-  Bridge.MakeDevice().reset();
-  EXPECT_FALSE(Bridge.KillsRecorded());
-  EXPECT_FALSE(Bridge.ServerRan());
 }
 
 } // namespace

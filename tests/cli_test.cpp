@@ -12,7 +12,6 @@
 #include <filesystem>
 #include <fstream>
 #include <functional>
-#include <set>
 #include <sstream>
 #include <string>
 #include <signal.h>
@@ -23,6 +22,7 @@ namespace midebug {
 namespace {
 
 using nlohmann::json;
+using test::Debuggee;
 using test::TScratchDir;
 
 /// The generous limit, in seconds, a resuming command waits for a stop;
@@ -74,18 +74,6 @@ std::string Quote(const std::string& Text) { return "'" + Text + "'"; }
 
 class CliTest : public ::testing::Test {
 protected:
-  /// Compiles Source (named Name.c, or Name.cpp with C++) into Scratch.
-  std::string Compile(const std::string& Name, const std::string& Source, bool CPlusPlus = false,
-                      const std::string& Flags = "") {
-    const std::string SourcePath = Scratch.WriteFile(Name + (CPlusPlus ? ".cpp" : ".c"), Source);
-    const std::string Program = Scratch.Path() + "/" + Name;
-    const std::string Command = std::string(CPlusPlus ? "g++" : "gcc") + " -g -O0 " + Flags + " -o " +
-                                Quote(Program) + " " + Quote(SourcePath);
-    if (std::system(Command.c_str()) != 0)
-      return {};
-    return Program;
-  }
-
   /// Runs `midebug --batch --json --wait LIMIT Arguments` with Commands on
   /// its standard input.
   TCliRun RunCli(const std::string& Arguments, const std::string& Commands) {
@@ -113,27 +101,9 @@ protected:
   TScratchDir Scratch;
 };
 
-/// A program that prints a marker and exits with 3.
-const char* const ExitThreeSource = "#include <stdio.h>\n"
-                                    "int main(void) { puts(\"marker-7781\"); return 3; }\n";
-
-/// A loop that calls a function; the comments mark the lines the steps
-/// must reach.
-const char* const SteppingSource = "static int square(int value) {\n"
-                                   "  int result = value * value; /* square-body */\n"
-                                   "  return result;\n"
-                                   "}\n"
-                                   "\n"
-                                   "int main(void) {\n"
-                                   "  int total = 0; /* main-first */\n"
-                                   "  for (int i = 1; i <= 2; ++i) /* main-loop */\n"
-                                   "    total += square(i); /* main-call */\n"
-                                   "  return total == 5 ? 4 : 1;\n"
-                                   "}\n";
-
-/// The line of SteppingSource that holds Marker.
+/// The line of tests/debuggees/loop.c that holds Marker.
 int LineOf(const std::string& Marker) {
-  std::istringstream Lines(SteppingSource);
+  std::istringstream Lines(ReadAll(test::DebuggeeSource("loop.c")));
   int Number = 0;
   for (std::string Line; std::getline(Lines, Line);) {
     ++Number;
@@ -150,8 +120,7 @@ std::string FileName(const json& Object) {
 // --- Start-up and the session's own commands ----------------------------------
 
 TEST_F(CliTest, CliStartLoadsTheProgramAndNamesItsLanguageAndCpu) {
-  const std::string Program = Compile("three", ExitThreeSource);
-  ASSERT_FALSE(Program.empty());
+  const std::string Program = Debuggee("exitthree");
   const TCliRun Run = RunCli(Quote(Program), "quit\n");
   EXPECT_EQ(Run.ExitCode, 0) << Run.Stderr;
   const json* Loaded = Run.Event("loaded");
@@ -163,8 +132,10 @@ TEST_F(CliTest, CliStartLoadsTheProgramAndNamesItsLanguageAndCpu) {
 }
 
 TEST_F(CliTest, CliStartGuessesCxxFromTheSourceBesideTheProgram) {
-  const std::string Program = Compile("plus", "int main() { return 0; }\n", true);
-  ASSERT_FALSE(Program.empty());
+  // A copy of a C++ program with an empty file of its name and ".cpp" beside.
+  const std::string Program = Scratch.Path() + "/plus";
+  std::filesystem::copy_file(Debuggee("exitthree"), Program);
+  Scratch.WriteFile("plus.cpp", "");
   const TCliRun Run = RunCli(Quote(Program), "");
   const json* Loaded = Run.Event("loaded");
   ASSERT_NE(Loaded, nullptr) << Run.Stdout;
@@ -179,43 +150,13 @@ TEST_F(CliTest, CliStartOfAMissingProgramIsAnErrorAndFails) {
   EXPECT_NE(Run.Lines[0]["error"].get<std::string>().find("No such file"), std::string::npos) << Run.Stdout;
 }
 
-TEST_F(CliTest, CliStartRejectsAnUnknownOptionWithUsage) {
-  const TCliRun Run = RunCli("--no-such-option prog", "");
-  EXPECT_EQ(Run.ExitCode, 2);
-  EXPECT_NE(Run.Stderr.find("unknown option '--no-such-option'"), std::string::npos) << Run.Stderr;
-  EXPECT_NE(Run.Stderr.find("usage:"), std::string::npos);
-  EXPECT_TRUE(Run.Lines.empty());
-}
-
-TEST_F(CliTest, CliCommandsHelpListsEveryCommand) {
-  const std::string Program = Compile("three", ExitThreeSource);
-  ASSERT_FALSE(Program.empty());
-  const TCliRun Run = RunCli(Quote(Program), "help\n");
-  const json* Help = Run.Answer("help");
-  ASSERT_NE(Help, nullptr) << Run.Stdout;
-  std::vector<std::string> Names;
-  for (const json& Command : (*Help)["commands"])
-    Names.push_back(Command["name"]);
-  for (const char* Expected : {"run", "start", "continue", "next", "step", "finish", "stepi", "nexti", "pause", "bt",
-                               "threads", "thread", "frame", "kill", "detach", "quit", "help"})
-    EXPECT_NE(std::find(Names.begin(), Names.end(), Expected), Names.end()) << Expected;
-}
-
-TEST_F(CliTest, CliCommandsUnknownCommandIsAnErrorAndTheSessionGoesOn) {
-  const std::string Program = Compile("three", ExitThreeSource);
-  ASSERT_FALSE(Program.empty());
-  const TCliRun Run = RunCli(Quote(Program), "frobnicate now\nhelp\n");
+TEST_F(CliTest, CliCommandsThatCannotRunSayWhyAndTheSessionGoesOn) {
+  const std::string Program = Debuggee("exitthree");
+  const TCliRun Run = RunCli(Quote(Program), "frobnicate now\nnext\nbt\nthread x\n");
   EXPECT_EQ(Run.ExitCode, 0);
   const json* Unknown = Run.Answer("frobnicate");
   ASSERT_NE(Unknown, nullptr) << Run.Stdout;
   EXPECT_NE((*Unknown)["error"].get<std::string>().find("unknown command 'frobnicate'"), std::string::npos);
-  EXPECT_NE(Run.Answer("help"), nullptr);
-}
-
-TEST_F(CliTest, CliCommandsThatNeedAStoppedProgramSayWhyBeforeRun) {
-  const std::string Program = Compile("three", ExitThreeSource);
-  ASSERT_FALSE(Program.empty());
-  const TCliRun Run = RunCli(Quote(Program), "next\nbt\nthread x\n");
   for (const char* Name : {"next", "bt"}) {
     const json* Answer = Run.Answer(Name);
     ASSERT_NE(Answer, nullptr) << Name;
@@ -229,8 +170,7 @@ TEST_F(CliTest, CliCommandsThatNeedAStoppedProgramSayWhyBeforeRun) {
 // --- Running to the exit ---------------------------------------------------------
 
 TEST_F(CliTest, CliRunReachesTheExitWithTheProgramsCodeAndOutput) {
-  const std::string Program = Compile("three", ExitThreeSource);
-  ASSERT_FALSE(Program.empty());
+  const std::string Program = Debuggee("exitthree");
   const TCliRun Run = RunCli(Quote(Program), "run\ncontinue\n");
   EXPECT_EQ(Run.ExitCode, 0);
   const json* Exited = Run.Event("exited");
@@ -251,8 +191,7 @@ TEST_F(CliTest, CliRunReachesTheExitWithTheProgramsCodeAndOutput) {
 }
 
 TEST_F(CliTest, CliLogKeepsTheMiTrafficInTheNamedFile) {
-  const std::string Program = Compile("three", ExitThreeSource);
-  ASSERT_FALSE(Program.empty());
+  const std::string Program = Debuggee("exitthree");
   const std::string Log = Scratch.Path() + "/logs/session.log";
   const TCliRun Run = RunCli("--log " + Quote(Log) + " " + Quote(Program), "quit\n");
   EXPECT_EQ(Run.ExitCode, 0) << Run.Stderr;
@@ -266,9 +205,7 @@ TEST_F(CliTest, CliLogKeepsTheMiTrafficInTheNamedFile) {
 }
 
 TEST_F(CliTest, CliRunPauseInterruptsAProgramThatNeverStopsAndKillEndsIt) {
-  const std::string Program =
-      Compile("busy", "int main(void) { volatile int spins = 0; for (;;) ++spins; }\n");
-  ASSERT_FALSE(Program.empty());
+  const std::string Program = Debuggee("busy");
   // The program never stops by itself, so the run's short wait always ends
   // unanswered; the later --wait wins over the default.
   // The wait also bounds the pause, whose stop takes several requests: leave
@@ -287,46 +224,8 @@ TEST_F(CliTest, CliRunPauseInterruptsAProgramThatNeverStopsAndKillEndsIt) {
   EXPECT_EQ(Run.Sequence(), Expected) << Run.Stdout;
 }
 
-TEST_F(CliTest, CliRunReportsThreadsThatStartAndEndAfterTheStartStop) {
-  const std::string Program = Compile("workers",
-                                      "#include <pthread.h>\n"
-                                      "static void *work(void *arg) { return arg; }\n"
-                                      "int main(void) {\n"
-                                      "  pthread_t workers[2];\n"
-                                      "  for (int i = 0; i < 2; ++i) pthread_create(&workers[i], 0, work, 0);\n"
-                                      "  for (int i = 0; i < 2; ++i) pthread_join(workers[i], 0);\n"
-                                      "  return 6;\n"
-                                      "}\n",
-                                      false, "-pthread");
-  ASSERT_FALSE(Program.empty());
-  // Threads are followed once the program has stopped at its start.
-  const TCliRun Run = RunCli(Quote(Program), "start\ncontinue\n");
-  std::set<int> Created;
-  std::set<int> Exited;
-  for (const json& Line : Run.Lines) {
-    if (Line.value("event", "") == "thread-created")
-      Created.insert(Line["thread"].get<int>());
-    if (Line.value("event", "") == "thread-exited")
-      Exited.insert(Line["thread"].get<int>());
-  }
-  // The main thread and at least the two workers, whose numbers GDB picks;
-  // every worker that appeared also ended.
-  EXPECT_TRUE(Created.contains(1)) << Run.Stdout;
-  EXPECT_GE(Created.size(), 3u) << Run.Stdout;
-  const json* StartAnswer = Run.Answer("start");
-  ASSERT_NE(StartAnswer, nullptr);
-  EXPECT_EQ((*StartAnswer)["state"], "stopped");
-  for (const int Thread : Created)
-    EXPECT_TRUE(Thread == 1 || Exited.contains(Thread)) << "thread " << Thread << "\n" << Run.Stdout;
-  const json* ExitedEvent = Run.Event("exited");
-  ASSERT_NE(ExitedEvent, nullptr) << Run.Stdout;
-  EXPECT_EQ((*ExitedEvent)["code"], 6);
-}
-
 TEST_F(CliTest, CliAttachShowsTheStackAndDetachLeavesTheProgramRunning) {
-  const std::string Program = Compile("sleeper", "#include <unistd.h>\n"
-                                                 "int main(void) { for (;;) sleep(1); }\n");
-  ASSERT_FALSE(Program.empty());
+  const std::string Program = Debuggee("sleeper");
   const std::string Start = "exec " + Quote(Program) + " >/dev/null 2>&1 & echo $!";
   FILE* Shell = popen(Start.c_str(), "r");
   ASSERT_NE(Shell, nullptr);
@@ -355,30 +254,17 @@ TEST_F(CliTest, CliAttachShowsTheStackAndDetachLeavesTheProgramRunning) {
 
 // --- Stopping and stepping -------------------------------------------------------
 
-TEST_F(CliTest, CliSteppingStartStopsAtMainsFirstLine) {
-  const std::string Program = Compile("loop", SteppingSource);
-  ASSERT_FALSE(Program.empty());
-  const TCliRun Run = RunCli(Quote(Program), "start\ncontinue\n");
-  const json* Stopped = Run.Event("stopped");
-  ASSERT_NE(Stopped, nullptr) << Run.Stdout << Run.Stderr;
-  EXPECT_EQ((*Stopped)["reason"], "breakpoint");
-  EXPECT_EQ(FileName(*Stopped), "loop.c");
-  EXPECT_EQ((*Stopped)["line"], LineOf("main-first"));
-  EXPECT_NE((*Stopped).value("text", "").find("main-first"), std::string::npos);
-  const json* Exited = Run.Event("exited");
-  ASSERT_NE(Exited, nullptr) << Run.Stdout;
-  EXPECT_EQ((*Exited)["code"], 4);
-}
-
 TEST_F(CliTest, CliSteppingNextStepAndFinishFollowTheSource) {
-  const std::string Program = Compile("loop", SteppingSource);
-  ASSERT_FALSE(Program.empty());
+  const std::string Program = Debuggee("loop");
   const TCliRun Run = RunCli(Quote(Program), "start\nnext\nnext\nstep\nbt\nfinish\ncontinue\n");
   std::vector<const json*> Stops;
   for (const json& Line : Run.Lines)
     if (Line.value("event", "") == "stopped")
       Stops.push_back(&Line);
   ASSERT_EQ(Stops.size(), 5u) << Run.Stdout << Run.Stderr;
+  EXPECT_EQ((*Stops[0])["reason"], "breakpoint");
+  EXPECT_EQ((*Stops[0])["line"], LineOf("main-first"));
+  EXPECT_NE((*Stops[0]).value("text", "").find("main-first"), std::string::npos);
   EXPECT_EQ((*Stops[1])["line"], LineOf("main-loop"));
   EXPECT_EQ((*Stops[1])["reason"], "step");
   EXPECT_EQ((*Stops[2])["line"], LineOf("main-call"));
@@ -404,8 +290,7 @@ TEST_F(CliTest, CliSteppingNextStepAndFinishFollowTheSource) {
 }
 
 TEST_F(CliTest, CliSteppingThreadsAndFrameDescribeTheStoppedProgram) {
-  const std::string Program = Compile("loop", SteppingSource);
-  ASSERT_FALSE(Program.empty());
+  const std::string Program = Debuggee("loop");
   const TCliRun Run = RunCli(Quote(Program), "start\nnext\nnext\nstep\nthreads\nframe 1\nthread 1\nframe 9\nkill\n");
   const json* Threads = Run.Answer("threads");
   ASSERT_NE(Threads, nullptr) << Run.Stdout;

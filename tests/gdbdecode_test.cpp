@@ -11,9 +11,7 @@
 
 #include <gtest/gtest.h>
 
-#include <array>
 #include <fstream>
-#include <memory>
 #include <string>
 #include <vector>
 
@@ -56,28 +54,6 @@ std::vector<Byte> Bytes16(std::initializer_list<Byte> Leading) {
 
 // --- Breakpoints ----------------------------------------------------------------
 
-TEST(DecoderBreakpoints, SingleLocationFromGdb13) {
-  TBreakInsertResult Result;
-  ASSERT_TRUE(Decode(Result, RecordedReply("prog-gdb13.txt", "2")));
-  EXPECT_EQ(Result.FBreakpoint, 2);
-  EXPECT_EQ(Result.FLocation.Address, 0x119eu);
-  EXPECT_EQ(Result.FLocation.Source, "prog.cpp");
-  EXPECT_EQ(Result.FLocation.Line, 15);
-  EXPECT_TRUE(Result.FAddresses.empty());
-}
-
-TEST(DecoderBreakpoints, MultipleLocationsFromGdb13) {
-  // A template instantiated twice: GDB 13 (mi2) puts the location tuples
-  // beside "bkpt", whose own address is <MULTIPLE>.
-  TBreakInsertResult Result;
-  ASSERT_TRUE(Decode(Result, RecordedReply("prog-gdb13.txt", "1")));
-  EXPECT_EQ(Result.FBreakpoint, 1);
-  EXPECT_EQ(Result.FAddresses, (TAddressArray{0x12a8, 0x12be}));
-  EXPECT_EQ(Result.FLocation.Address, 0x12a8u);
-  EXPECT_EQ(Result.FLocation.Source, "prog.cpp");
-  EXPECT_EQ(Result.FLocation.Line, 4);
-}
-
 TEST(DecoderBreakpoints, LocationsInsideBkpt) {
   // Newer GDB (and mi3) lists them as "locations" inside the tuple.
   TBreakInsertResult Result;
@@ -88,15 +64,6 @@ TEST(DecoderBreakpoints, LocationsInsideBkpt) {
   EXPECT_EQ(Result.FAddresses, (TAddressArray{0x10, 0x20}));
   EXPECT_EQ(Result.FLocation.Address, 0x10u);
   EXPECT_EQ(Result.FLocation.Line, 7);
-}
-
-TEST(DecoderBreakpoints, PendingBreakpointHasNoAddress) {
-  TBreakInsertResult Result;
-  ASSERT_TRUE(Decode(Result, RecordedReply("regs-gdb13-flags.txt", "1")));
-  EXPECT_EQ(Result.FBreakpoint, 1);
-  EXPECT_EQ(Result.FLocation.Address, 0u);
-  EXPECT_EQ(Result.FLocation.Source, "");
-  EXPECT_TRUE(Result.FAddresses.empty());
 }
 
 TEST(DecoderBreakpoints, DottedNumberFailsAndKeepsTheLocation) {
@@ -146,19 +113,6 @@ TEST(DecoderBreakpoints, WatchpointOfEveryKind) {
 
 // --- Threads --------------------------------------------------------------------
 
-TEST(DecoderThreads, ThreadInfoFromGdb13) {
-  TThreadInfoResult Result(false);
-  ASSERT_TRUE(Decode(Result, RecordedReply("regs-gdb13.txt", "6")));
-  EXPECT_EQ(Result.FIds, (TIntegerArray{1, 2}));
-  EXPECT_EQ(Result.FNames, (TStringArray{"0x7ffff7dcf740 (LWP 11651)", "0x7ffff7dce6c0 (LWP 11655)"}));
-  EXPECT_EQ(Result.FStates, (TStringArray{"stopped", "stopped"}));
-  ASSERT_EQ(Result.FLocations.size(), 2u);
-  EXPECT_EQ(Result.FLocations[0].Address, 0x55555555517cu);
-  EXPECT_EQ(Result.FLocations[0].Line, 8);
-  EXPECT_EQ(Result.FLocations[1].Source, "regs.c");
-  EXPECT_EQ(Result.FLocations[1].Line, 6);
-}
-
 TEST(DecoderThreads, ThreadInfoStateOnlySkipsNamesAndBadIds) {
   TThreadInfoResult Result(true);
   ASSERT_TRUE(Decode(Result, R"(4^done,threads=[{id="x",state="running"},)"
@@ -174,11 +128,6 @@ TEST(DecoderThreads, ThreadInfoStateOnlySkipsNamesAndBadIds) {
 }
 
 TEST(DecoderThreads, ThreadListIds) {
-  TThreadListIdsResult Gdb;
-  ASSERT_TRUE(Decode(Gdb, RecordedReply("regs-gdb13.txt", "7")));
-  EXPECT_EQ(Gdb.FIds, (TIntegerArray{1, 2}));
-  EXPECT_EQ(Gdb.FStates, (TStringArray{"", ""}));
-
   TThreadListIdsResult WithStates;
   ASSERT_TRUE(Decode(WithStates, R"(3^done,thread-ids={thread-id="7",thread-id="9"},)"
                                  R"(threads={thread={thread-id="9",state="stopped",unique-id="u9"},)"
@@ -211,17 +160,6 @@ TEST(DecoderThreads, ThreadSelectMustNameTheRequestedThread) {
 
 // --- Stack ----------------------------------------------------------------------
 
-TEST(DecoderStack, FramesFromGdb13) {
-  TStackListFramesResult Result;
-  ASSERT_TRUE(Decode(Result, RecordedReply("prog-gdb13.txt", "7")));
-  ASSERT_EQ(Result.FStackFrames.size(), 2u);
-  EXPECT_EQ(Result.FStackFrames[0].Header, "twice<int>");
-  EXPECT_EQ(Result.FStackFrames[0].Location.Line, 4);
-  EXPECT_EQ(Result.FStackFrames[1].Header, "main");
-  EXPECT_EQ(Result.FStackFrames[1].Location.Address, 0x555555555209u);
-  EXPECT_EQ(Result.FStackFrames[1].Location.Source, "prog.cpp");
-}
-
 TEST(DecoderStack, FramesArePlacedByLevel) {
   TStackListFramesResult Result;
   ASSERT_TRUE(Decode(Result, R"(9^done,stack=[frame={level="0",func="a"},frame={level="1",func="b"},)"
@@ -234,14 +172,6 @@ TEST(DecoderStack, FramesArePlacedByLevel) {
   EXPECT_EQ(Result.FStackFrames[3].Location.Line, 0);
 }
 
-TEST(DecoderStack, ErrorPayloadWithoutFramesFails) {
-  // GDB 13: -stack-list-frames 5 9 on a two-frame stack.
-  TStackListFramesResult Result;
-  EXPECT_FALSE(Decode(Result, RecordedReply("regs-gdb13.txt", "37")));
-  EXPECT_TRUE(Result.FStackFrames.empty());
-  EXPECT_EQ(Result.FErrorMessage, "");
-}
-
 TEST(DecoderStack, ArgumentsInEveryPrintValuesForm) {
   using TFrames = std::vector<std::vector<std::pair<std::string, std::string>>>;
   struct TCase {
@@ -249,7 +179,6 @@ TEST(DecoderStack, ArgumentsInEveryPrintValuesForm) {
     TFrames Frames;
   } Cases[] = {
       {RecordedReply("prog-gdb13.txt", "8"), {{{"v", "3"}}, {{"argc", "1"}, {"argv", "0x7fffffffe798"}}}},
-      {RecordedReply("prog-gdb13.txt", "9"), {{{"v", "3"}}, {{"argc", "1"}, {"argv", "0x7fffffffe798"}}}},
       // --no-values lists names alone.
       {R"(8^done,stack-args=[frame={level="0",args=[name="x",name="y"]},frame={level="1",args=[]}])",
        {{{"x", ""}, {"y", ""}}, {}}},
@@ -276,7 +205,6 @@ TEST(DecoderStack, LocalsInBothListForms) {
   } Cases[] = {
       {RecordedReply("prog-gdb13.txt", "10"), {"r"}}, // --simple-values: tuples
       {RecordedReply("prog-gdb13.txt", "11"), {"r"}}, // 0: names alone
-      {RecordedReply("regs-gdb13.txt", "32"), {"p", "bytes", "t", "ld", "v", "w", "r"}},
       {R"(6^done,locals=[])", {}},
       {R"(6^done,other="1")", {}},
   };
@@ -299,19 +227,6 @@ TEST(DecoderStack, RunNotAtTheCursorIsReadOnce) {
   EXPECT_EQ(Locals.FStackLocals, TStringArray{"a"});
 }
 
-TEST(DecoderStack, FrameAndDepth) {
-  TStackInfoFrameResult Frame;
-  ASSERT_TRUE(Decode(Frame, RecordedReply("regs-gdb13.txt", "27")));
-  EXPECT_EQ(Frame.FLocation.Line, 21);
-  EXPECT_EQ(Frame.FLocation.Address, 0x5555555552a8u);
-  TStackInfoFrameResult NoFrame;
-  EXPECT_FALSE(Decode(NoFrame, R"(3^done,depth="1")"));
-
-  TStackInfoDepthResult Depth;
-  ASSERT_TRUE(Decode(Depth, RecordedReply("regs-gdb13.txt", "36")));
-  EXPECT_EQ(Depth.FStackDepth, 1);
-}
-
 // --- Source lines ---------------------------------------------------------------
 
 TEST(DecoderSymbols, LinesWithAndWithoutAddresses) {
@@ -323,31 +238,14 @@ TEST(DecoderSymbols, LinesWithAndWithoutAddresses) {
   EXPECT_EQ(WithAddresses.FAddresses, (TAddressArray{0x555555555159, 0x55555555517c}));
 
   TSymbolListLinesResult LinesOnly(false);
-  ASSERT_TRUE(Decode(LinesOnly, RecordedReply("regs-gdb13.txt", "28")));
-  EXPECT_EQ(LinesOnly.FLines.size(), 25u);
-  EXPECT_EQ(LinesOnly.FLines[3], 8);
+  ASSERT_TRUE(Decode(LinesOnly, Reply));
+  EXPECT_EQ(LinesOnly.FLines, (TIntegerArray{6, 8}));
   EXPECT_TRUE(LinesOnly.FAddresses.empty());
 }
 
 // --- Variable objects -------------------------------------------------------------
 
-TEST(DecoderVariables, CreateAndChildrenFromGdb13) {
-  TVarCreateResult Create;
-  ASSERT_TRUE(Decode(Create, RecordedReply("regs-gdb13.txt", "15")));
-  EXPECT_EQ(Create.FName, "pt");
-  EXPECT_EQ(Create.FNumChild, 2);
-  EXPECT_EQ(Create.FType, "struct point");
-  EXPECT_EQ(Create.FValue, "{...}");
-  EXPECT_TRUE(Create.FValueDefined);
-
-  TVarListChildrenResult Children;
-  ASSERT_TRUE(Decode(Children, RecordedReply("regs-gdb13.txt", "16")));
-  ASSERT_EQ(Children.FChildren.size(), 2u);
-  EXPECT_EQ(Children.FChildren[1].Name, "pt.y");
-  EXPECT_EQ(Children.FChildren[1].Expr, "y");
-  EXPECT_EQ(Children.FChildren[1].VarType, "int");
-  EXPECT_EQ(Children.FChildren[1].NumChild, 0);
-
+TEST(DecoderVariables, ChildCountIsBounded) {
   TVarInfoNumChildrenResult Count;
   ASSERT_TRUE(Decode(Count, R"(4^done,numchild="100000")"));
   EXPECT_EQ(Count.FCount, 5000);
@@ -363,13 +261,6 @@ TEST(DecoderVariables, ChildrenCountComesFromTheReply) {
 }
 
 TEST(DecoderVariables, UpdateStopsAtTheFirstElementOutOfScope) {
-  TVarUpdateResult InScope;
-  ASSERT_TRUE(Decode(InScope, RecordedReply("regs-gdb13.txt", "22")));
-  ASSERT_EQ(InScope.FChangeList.size(), 1u);
-  EXPECT_EQ(InScope.FChangeList[0].Name, "pt.x");
-  EXPECT_EQ(InScope.FChangeList[0].Value, "7");
-  EXPECT_FALSE(InScope.FOutOfScope);
-
   TVarUpdateResult Mixed;
   ASSERT_TRUE(Decode(Mixed, R"(5^done,changelist=[{name="a",value="1",in_scope="true"},)"
                             R"({name="b",in_scope="false"},{name="c",value="3",in_scope="true"}])"));
@@ -388,26 +279,7 @@ TEST(DecoderVariables, UpdateStopsAtTheFirstElementOutOfScope) {
   EXPECT_EQ(Empty.FChangeList.size(), 1u) << "an empty change list leaves the old one";
 }
 
-/// Decodes Reply into a fresh TResult and returns the text it read.
-template <class TResult> std::string DecodedText(std::string TResult::*Field, const std::string& Reply) {
-  TResult Result;
-  EXPECT_TRUE(Decode(Result, Reply)) << Reply;
-  return Result.*Field;
-}
-
-TEST(DecoderVariables, SingleValueAnswers) {
-  const auto Reply = [](const char* Token) { return RecordedReply("regs-gdb13.txt", Token); };
-  EXPECT_EQ(DecodedText(&TVarEvaluateExpressionResult::FValue, Reply("20")), "3");
-  EXPECT_EQ(DecodedText(&TVarAssignResult::FValue, Reply("21")), "7");
-  EXPECT_EQ(DecodedText(&TDataEvaluateExpressionResult::FValue, Reply("25")), "{x = 7, y = 4}");
-  EXPECT_EQ(DecodedText(&TGdbShowResult::FValue, Reply("31")), "80");
-  EXPECT_EQ(DecodedText(&TVarInfoPathExpressionResult::FExpr, Reply("18")), "(p).y");
-}
-
 TEST(DecoderVariables, EditableAttributeByDebugger) {
-  TVarShowAttributesResult Gdb;
-  ASSERT_TRUE(Decode(Gdb, RecordedReply("regs-gdb13.txt", "19")));
-  EXPECT_TRUE(Gdb.FEditable);
   TVarShowAttributesResult LLDB;
   ASSERT_TRUE(Decode(LLDB, R"(3^done,attr="editable")", true));
   EXPECT_FALSE(LLDB.FEditable) << "LLDB answers with status";
@@ -416,17 +288,6 @@ TEST(DecoderVariables, EditableAttributeByDebugger) {
 }
 
 // --- Registers --------------------------------------------------------------------
-
-TEST(DecoderRegisters, NamesKeepEmptyEntries) {
-  TDataListRegisterNamesResult Result(gcAMD64, "Linux");
-  ASSERT_TRUE(Decode(Result, RecordedReply("prog-gdb13.txt", "17")));
-  ASSERT_GT(Result.FNames.size(), 80u);
-  EXPECT_EQ(Result.FNames[17], "eflags");
-  EXPECT_EQ(Result.FNames[24], "st0");
-  EXPECT_EQ(Result.FNames[41], "xmm1");
-  EXPECT_EQ(Result.FNames[73], "") << "unnamed registers keep the numbering";
-  EXPECT_EQ(Result.FNames[79], "xmm16");
-}
 
 TEST(DecoderRegisters, GeneralValuesInRequestedOrder) {
   TDataListRegisterValuesResult All(TIntegerArray{0, 1, 7, 16, 17});
@@ -470,23 +331,10 @@ TEST(DecoderRegisters, FlagsRegisterShapes) {
 }
 
 TEST(DecoderRegisters, XmmFromNestedBraces) {
-  // xmm1 after movdqa of {0x11223344, 0x8899aabb, 0x00112233, 0x44556677}, as
-  // GDB 13 prints it in hexadecimal, natural and raw format.
-  const std::vector<Byte> Expected = {0x44, 0x33, 0x22, 0x11, 0xbb, 0xaa, 0x99, 0x88,
-                                      0x33, 0x22, 0x11, 0x00, 0x77, 0x66, 0x55, 0x44};
-  for (const char* Token : {"2", "3"}) {
-    TDataListXMMRegisterValuesResult Result(TIntegerArray{41});
-    ASSERT_TRUE(Decode(Result, RecordedReply("regs-gdb13.txt", Token)));
-    ASSERT_EQ(Result.FValues.size(), 1u) << Token;
-    EXPECT_EQ(BytesOf(Result.FValues[0]), Expected) << Token;
-  }
   struct TCase {
     std::string Value;
     std::vector<Byte> Bytes;
   } Cases[] = {
-      // Real: xmm0 holding the double 2.5, raw format with all 32 digits.
-      {RecordedReply("prog-gdb13.txt", "49").substr(RecordedReply("prog-gdb13.txt", "49").find("{v8_bfloat16")),
-       Bytes16({0, 0, 0, 0, 0, 0, 0x04, 0x40})},
       {"{v4_float = {0x0, 0x0, 0x0, 0x0}, v16_int8 = {0x0 <repeats 16 times>}, uint128 = 0x0}", Bytes16({})},
       // Without uint128 the byte vector serves, repeats expanded.
       {"{v4_int32 = {0x1, 0x0, 0x0, 0x2000000}, v16_int8 = {0x1, 0x0 <repeats 14 times>, 0x2}}",
@@ -506,14 +354,12 @@ TEST(DecoderRegisters, XmmFromNestedBraces) {
 }
 
 TEST(DecoderRegisters, FpuKeepsTheWholeEightyBitValue) {
-  // st0 holding 5.0L: GDB 13 prints the raw 80-bit value.
-  TDataListFPURegisterValuesResult Result(TIntegerArray{24, 25, 32, 33});
+  // The control words, as GDB 13 prints them in raw format.
+  TDataListFPURegisterValuesResult Result(TIntegerArray{32, 33});
   ASSERT_TRUE(Decode(Result, RecordedReply("regs-gdb13-flags.txt", "9")));
-  ASSERT_EQ(Result.FValues.size(), 4u);
-  EXPECT_EQ(BytesOf(Result.FValues[0]), Bytes16({0, 0, 0, 0, 0, 0, 0, 0xa0, 0x01, 0x40}));
-  EXPECT_EQ(BytesOf(Result.FValues[1]), Bytes16({}));
-  EXPECT_EQ(BytesOf(Result.FValues[2]), Bytes16({0x7f, 0x03}));
-  EXPECT_EQ(BytesOf(Result.FValues[3]), Bytes16({0x00, 0x38}));
+  ASSERT_EQ(Result.FValues.size(), 2u);
+  EXPECT_EQ(BytesOf(Result.FValues[0]), Bytes16({0x7f, 0x03}));
+  EXPECT_EQ(BytesOf(Result.FValues[1]), Bytes16({0x00, 0x38}));
 
   TDataListFPURegisterValuesResult Natural(24);
   ASSERT_TRUE(Decode(Natural, R"(5^done,register-values=[{number="24",value="5"}])"));
@@ -522,42 +368,26 @@ TEST(DecoderRegisters, FpuKeepsTheWholeEightyBitValue) {
 
 // --- Memory -----------------------------------------------------------------------
 
-TEST(DecoderMemory, BytesFromContents) {
+TEST(DecoderMemory, BytesFromContentsOrWords) {
   struct TCase {
+    bool AsBytes;
     std::string Reply;
     bool Success;
     std::vector<Byte> Bytes;
   } Cases[] = {
-      {RecordedReply("regs-gdb13.txt", "23"), true, {0x0a, 0x0b, 0x0c, 0xff}},
-      {R"(4^done,memory=[{begin="0x1",contents="0aff1"}])", true, {10, 255}},
-      {R"(4^done,memory=[{begin="0x1",contents="zz01"}])", true, {0, 1}},
-      {R"(4^done,memory=[{begin="0x1",contents=""}])", true, {}},
-      {R"(4^done,memory=[{begin="0x1"}])", false, {9}},
-      {R"(4^done,other="1")", false, {9}},
-  };
-  for (const TCase& Case : Cases) {
-    TDataReadMemoryResult Result(true);
-    Result.FData = {9};
-    EXPECT_EQ(Decode(Result, Case.Reply), Case.Success) << Case.Reply;
-    EXPECT_EQ(Result.FData, Case.Bytes) << Case.Reply;
-  }
-}
-
-TEST(DecoderMemory, WordsFromData) {
-  struct TCase {
-    std::string Reply;
-    bool Success;
-    std::vector<Byte> Bytes;
-  } Cases[] = {
-      {RecordedReply("regs-gdb13.txt", "24"), true, {0x0a, 0x0b, 0x0c, 0xff}},
-      {R"(4^done,nr-bytes="2",memory=[{addr="0x1",data=["0x1ff","7","0x3"]}])", true, {0xff, 7}},
-      {R"(4^done,nr-bytes="0")", true, {9}},
-      {R"(4^done,nr-bytes="3",memory=[{addr="0x1"}])", false, {9}},
+      {true, RecordedReply("regs-gdb13.txt", "23"), true, {0x0a, 0x0b, 0x0c, 0xff}},
+      {true, R"(4^done,memory=[{begin="0x1",contents="0aff1"}])", true, {10, 255}},
+      {true, R"(4^done,memory=[{begin="0x1",contents="zz01"}])", true, {0, 1}},
+      {true, R"(4^done,memory=[{begin="0x1"}])", false, {9}},
+      {false, RecordedReply("regs-gdb13.txt", "24"), true, {0x0a, 0x0b, 0x0c, 0xff}},
+      {false, R"(4^done,nr-bytes="2",memory=[{addr="0x1",data=["0x1ff","7","0x3"]}])", true, {0xff, 7}},
+      {false, R"(4^done,nr-bytes="0")", true, {9}},
+      {false, R"(4^done,nr-bytes="3",memory=[{addr="0x1"}])", false, {9}},
       // A count far beyond the data reads what is there.
-      {R"(4^done,nr-bytes="2147483647",memory=[{addr="0x1",data=["0x1"]}])", true, {1}},
+      {false, R"(4^done,nr-bytes="2147483647",memory=[{addr="0x1",data=["0x1"]}])", true, {1}},
   };
   for (const TCase& Case : Cases) {
-    TDataReadMemoryResult Result(false);
+    TDataReadMemoryResult Result(Case.AsBytes);
     Result.FData = {9};
     EXPECT_EQ(Decode(Result, Case.Reply), Case.Success) << Case.Reply;
     EXPECT_EQ(Result.FData, Case.Bytes) << Case.Reply;
@@ -595,48 +425,17 @@ std::vector<TInstruction> Instructions(const TDataDisassembleResult& Result) {
   return Read;
 }
 
-TEST(DecoderDisassembly, EveryModeFromGdb13) {
-  const TInstruction Push = {0x555555555172, 0, "push   %rbp", 0, ""};
-  const TInstruction Move = {0x555555555173, 0, "mov    %rsp,%rbp", 0, ""};
-  const TInstruction Store = {0x555555555176, 0, "mov    %edi,-0x14(%rbp)", 0, ""};
-  auto WithSource = [](TInstruction Instruction) {
-    Instruction.Line = 7;
-    Instruction.Source = "regs.c";
-    return Instruction;
-  };
-  auto WithSize = [](TInstruction Instruction, Integer Size) {
-    Instruction.Size = Size;
-    return Instruction;
-  };
-  struct TCase {
-    std::string Session;
-    std::string Token;
-    bool IncludeSource;
-    std::vector<TInstruction> Expected;
-  } Cases[] = {
-      {"regs-gdb13.txt", "30", false, {Push, Move, Store}},              // mode 0
-      {"regs-gdb13.txt", "29", true, {WithSource(Push), Move, Store}},   // mode 1
-      {"regs-gdb13-flags.txt", "6", true, {WithSize(WithSource(Push), 1), WithSize(Move, 3)}}, // mode 3
-      {"regs-gdb13.txt", "29", false, {WithSource(Push), Move, Store}},  // the form follows the reply
-  };
-  for (const TCase& Case : Cases) {
-    TDataDisassembleResult Result(Case.IncludeSource);
-    ASSERT_TRUE(Decode(Result, RecordedReply(Case.Session, Case.Token))) << Case.Token;
-    EXPECT_EQ(Instructions(Result), Case.Expected) << Case.Session << " " << Case.Token;
-  }
-  TDataDisassembleResult Opcodes(false);
-  ASSERT_TRUE(Decode(Opcodes, RecordedReply("prog-gdb13.txt", "26")));
-  ASSERT_EQ(Opcodes.FData.size(), 3u);
-  EXPECT_EQ(Opcodes.FData[0].Size, 3) << "8b 45 ec";
-  EXPECT_EQ(Opcodes.FData[1].Size, 2);
-
+TEST(DecoderDisassembly, SizesAndSourceLinesWhereTheReplyHasThem) {
+  // GDB 13, mode 3: opcodes give the size, the source line only the first.
+  TDataDisassembleResult Mode3(true);
+  ASSERT_TRUE(Decode(Mode3, RecordedReply("regs-gdb13-flags.txt", "6")));
+  EXPECT_EQ(Instructions(Mode3), (std::vector<TInstruction>{{0x555555555172, 1, "push   %rbp", 7, "regs.c"},
+                                                             {0x555555555173, 3, "mov    %rsp,%rbp", 0, ""}}));
   // GDB 13, mode 1 on a function compiled without -g: plain instructions.
   TDataDisassembleResult NoLines(true);
   ASSERT_TRUE(Decode(NoLines, R"(2^done,asm_insns=[{address="0x0000000000001139",func-name="nodbg",offset="0",)"
-                              R"(inst="push   %rbp"},{address="0x000000000000113a",func-name="nodbg",offset="1",)"
-                              R"(inst="mov    %rsp,%rbp"}])"));
-  EXPECT_EQ(Instructions(NoLines), (std::vector<TInstruction>{{0x1139, 0, "push   %rbp", 0, ""},
-                                                               {0x113a, 0, "mov    %rsp,%rbp", 0, ""}}));
+                              R"(inst="push   %rbp"}])"));
+  EXPECT_EQ(Instructions(NoLines), (std::vector<TInstruction>{{0x1139, 0, "push   %rbp", 0, ""}}));
 
   TDataDisassembleResult Sized(false);
   ASSERT_TRUE(Decode(Sized, R"(4^done,asm_insns=[{address="0x10",size="5",inst="call 0x20"}])"));
@@ -662,70 +461,6 @@ TEST(DecoderOther, ProcessAndTargetAnswers) {
   EXPECT_FALSE(Sync.FAsyncTarget);
   TTargetInfoAsyncResult Unknown;
   EXPECT_FALSE(Decode(Unknown, R"(3^done,other="true")"));
-}
-
-// --- Broken input -----------------------------------------------------------------
-
-/// One result object of every decoded command.
-std::vector<std::unique_ptr<TGDBResult>> EveryResult() {
-  std::vector<std::unique_ptr<TGDBResult>> Results;
-  Results.push_back(std::make_unique<TBreakInsertResult>());
-  Results.push_back(std::make_unique<TBreakWatchResult>());
-  Results.push_back(std::make_unique<TThreadInfoResult>(false));
-  Results.push_back(std::make_unique<TThreadListIdsResult>());
-  Results.push_back(std::make_unique<TThreadSelectResult>(1));
-  Results.push_back(std::make_unique<TStackInfoFrameResult>());
-  Results.push_back(std::make_unique<TStackListFramesResult>());
-  Results.push_back(std::make_unique<TStackListArgumentsResult>());
-  Results.push_back(std::make_unique<TStackListLocalsResult>());
-  Results.push_back(std::make_unique<TSymbolListLinesResult>(true));
-  Results.push_back(std::make_unique<TVarCreateResult>());
-  Results.push_back(std::make_unique<TVarInfoNumChildrenResult>());
-  Results.push_back(std::make_unique<TVarListChildrenResult>());
-  Results.push_back(std::make_unique<TVarUpdateResult>());
-  Results.push_back(std::make_unique<TDataDisassembleResult>(true));
-  Results.push_back(std::make_unique<TDataDisassembleResult>(false));
-  Results.push_back(std::make_unique<TDataListRegisterNamesResult>(gcAMD64, "Linux"));
-  Results.push_back(std::make_unique<TDataListRegisterValuesResult>(TIntegerArray{0, 17, 24}));
-  Results.push_back(std::make_unique<TDataListRegisterValuesResult>(17, true));
-  Results.push_back(std::make_unique<TDataListXMMRegisterValuesResult>(TIntegerArray{24, 40, 41, 55}));
-  Results.push_back(std::make_unique<TDataListFPURegisterValuesResult>(24));
-  Results.push_back(std::make_unique<TDataReadMemoryResult>(true));
-  Results.push_back(std::make_unique<TDataReadMemoryResult>(false));
-  Results.push_back(std::make_unique<TDataInfoLineResult>());
-  return Results;
-}
-
-TEST(DecoderGarbage, TruncatedAndMixedRepliesAreSafe) {
-  // Every recorded reply, cut at every length, is given to every decoder:
-  // nothing may crash, hang or read out of bounds (run under the sanitizers).
-  std::vector<std::string> Replies;
-  for (const char* Session : {"prog-gdb13.txt", "regs-gdb13.txt", "regs-gdb13-flags.txt"}) {
-    std::ifstream File(test::TestDataDir() + "/replies/" + Session);
-    for (std::string Line; std::getline(File, Line);) {
-      const size_t Caret = Line.find("^done,");
-      if (Caret != std::string::npos && Line.size() < 4000)
-        Replies.push_back(Line.substr(Caret + 6));
-    }
-  }
-  Replies.push_back(
-      R"(register-values=[{number="40",value="{uint128 = , v16_int8 = {0x1 <repeats -5 times>, <repeats}"}])");
-  Replies.push_back(R"(register-values=[{number="40",value="{{{{}}}}}}},,, = = {"},{number="41",value="(0x1,"}])");
-  Replies.push_back(R"(register-values=[{number="24",value="[ ZF"},{number="25",value="0x"},{number="32",value="["}])");
-  ASSERT_GT(Replies.size(), 40u);
-  size_t Decoded = 0;
-  for (const std::string& Payload : Replies) {
-    for (size_t Cut = Payload.size() > 300 ? Payload.size() - 300 : 0; Cut <= Payload.size(); ++Cut) {
-      for (const std::unique_ptr<TGDBResult>& Result : EveryResult()) {
-        TRecordingProcess Process;
-        Process.Register("1", *Result);
-        ProcessGDBOutput("1^done," + Payload.substr(0, Cut) + "\n", Process);
-        ASSERT_TRUE(Result->FAvailable);
-        ++Decoded;
-      }
-    }
-  }
-  EXPECT_GT(Decoded, 1000u);
 }
 
 } // namespace

@@ -11,16 +11,11 @@
 #include <gtest/gtest.h>
 
 #include <filesystem>
-#include <fstream>
-#include <sstream>
-#include <thread>
 
 namespace midebug {
 namespace {
 
 using test::ReplyContaining;
-using test::FakeDebuggerPath;
-using test::TestDataDir;
 using test::TScopedEnv;
 using test::TScratchDir;
 
@@ -55,15 +50,8 @@ TEST(LocalAgentWithGdb, RemoteKernelRunsARoundTripThroughBothChannels) {
 
 TEST(LocalAgentWithGdb, ReportsTheCapabilitiesGdbHasOnLinux) {
   auto Kernel = StartLocalGdb();
-  EXPECT_EQ(Kernel->GetCapabilities(), TLocalAgentClient::GDBCapabilities);
   EXPECT_TRUE(Kernel->IsLinux());
   EXPECT_FALSE(Kernel->IsLLDB());
-  EXPECT_FALSE(Kernel->IsWindows());
-  EXPECT_TRUE(Kernel->SupportThreadNotification());
-  EXPECT_TRUE(Kernel->SupportPidNotification());
-  EXPECT_FALSE(Kernel->SupportExecInterruptCommand());
-  EXPECT_FALSE(Kernel->SupportStopOnEntryPoint());
-  EXPECT_EQ(Kernel->GetEndOfLineMarker(), "(gdb) \n");
 
   // Each command-backed bit agrees with what this GDB says of the command.
   struct TCommandBit {
@@ -107,78 +95,14 @@ TEST(LocalAgentWithGdb, InterruptsAndKillsTheDebuggee) {
   EXPECT_NE(ReplyContaining(*Kernel, "*stopped").find("exited-signalled"), std::string::npos);
 }
 
-TEST(LocalAgentChannels, StopReleasesAReaderWaitingOnTheOtherChannel) {
-  TLocalAgentClient Reader;
-  TLocalAgentClient Writer;
-  Reader.Connect(nullptr);
-  Writer.Connect(nullptr);
-  Integer Id = 0;
-  Int64 EntryPoint = -1;
-  Int64 Capabilities = 0;
-  std::string InitFile;
-  ASSERT_TRUE(Writer.GDBStart("gdb", 0, ktGDB, Id, EntryPoint, Capabilities, InitFile)) << Writer.GetLastError();
-  EXPECT_EQ(EntryPoint, 0);
-  std::string Greeting;
-  ASSERT_TRUE(Reader.GDBGetReply(Id, Greeting)) << Reader.GetLastError();
-
-  // GDB prints nothing more until asked: the reader waits until the stop.
-  bool ReadResult = true;
-  std::thread Waiting([&] {
-    std::string Reply;
-    ReadResult = Reader.GDBGetReply(Id, Reply);
-  });
-  Writer.GDBStop(Id);
-  Waiting.join();
-  EXPECT_FALSE(ReadResult);
-  EXPECT_NE(Reader.GetLastError(), "");
-  EXPECT_FALSE(Writer.GDBSendRequest(Id, "1-gdb-version"));
-  EXPECT_EQ(Writer.GetLastError(), "no debugger instance " + std::to_string(Id));
-}
-
-TEST(LocalAgentChannels, LogGoesIntoTheDebuggersTrafficLog) {
-  TScratchDir LogDir;
-  TScopedEnv Debug("GDB_DEBUG", "1");
-  TScopedEnv OutDir("GDB_OUTDIR", LogDir.Path());
-  {
-    auto Kernel = StartLocalGdb();
-    Kernel->Log("a line the process wrote", true);
-  }
-  std::string Log;
-  for (const auto& Entry : std::filesystem::directory_iterator(LogDir.Path())) {
-    std::ifstream In(Entry.path());
-    std::stringstream Text;
-    Text << In.rdbuf();
-    Log += Text.str();
-  }
-  EXPECT_NE(Log.find("=thread-group-added"), std::string::npos) << Log;
-  EXPECT_NE(Log.find("a line the process wrote\n"), std::string::npos) << Log;
-}
-
-TEST(LocalAgentChannels, MissingDebuggerIsNamedByTheWriteChannel) {
-  TGDBRemoteKernel Kernel(LocalProfileName, "/no/such/dir/gdb", 0);
-  EXPECT_FALSE(Kernel.Start());
-  EXPECT_EQ(Kernel.GetLastError(false), "Could not find program, '/no/such/dir/gdb'");
-  std::string Reply;
-  EXPECT_FALSE(Kernel.GetReply(Reply));
-}
-
 TEST(LocalAgentWithLldbMi, StartsTheFrontEndFromPathAndReportsLldbCapabilities) {
-  TScratchDir Bin;
-  std::filesystem::copy_file(FakeDebuggerPath(), Bin.Path() + "/lldb-mi");
-  TScopedEnv Path("PATH", Bin.Path() + ":" + GetEnvironmentVariable("PATH"));
-  TScopedEnv Script("FAKEMI_SCRIPT", TestDataDir() + "/fakemi/localagent-lldb.script");
+  test::TFakeOnPath Fake("lldb-mi", "localagent-lldb.script");
 
   TGDBRemoteKernel Kernel(LocalProfileName, "lldb-mi", 0);
   Kernel.FKernelType = 6;
   ASSERT_TRUE(Kernel.Start()) << Kernel.GetLastError(false);
-  EXPECT_EQ(Kernel.GetCapabilities(), TLocalAgentClient::LLDBCapabilities());
   EXPECT_TRUE(Kernel.IsLLDB());
-  EXPECT_TRUE(Kernel.IsLinux());
   EXPECT_FALSE(Kernel.IsWindows());
-  EXPECT_FALSE(Kernel.IsAndroid64());
-  EXPECT_TRUE(Kernel.SupportPidNotification());
-  EXPECT_FALSE(Kernel.SupportPidInfoCommand());
-  EXPECT_EQ(Kernel.GetEndOfLineMarker(), "(gdb)\n");
 
   // The greeting block is what the front end printed before its prompt:
   // here, the arguments it was started with.

@@ -17,19 +17,6 @@ using namespace std::chrono_literals;
 /// Long enough never to expire on a sound run; a hang shows as a failure.
 constexpr auto GenerousWait = 30s;
 
-TEST(MainThreadQueue, RunsQueuedDeliveriesInOrderAndOnlyOnce) {
-  TMainThreadQueue Queue;
-  Queue.SetMainThread();
-  std::vector<int> Order;
-  for (int Index = 0; Index < 5; ++Index)
-    Queue.Post([&Order, Index] { Order.push_back(Index); });
-  EXPECT_TRUE(Order.empty());
-  EXPECT_EQ(Queue.ProcessPending(), 5u);
-  EXPECT_EQ(Order, (std::vector<int>{0, 1, 2, 3, 4}));
-  EXPECT_EQ(Queue.ProcessPending(), 0u);
-  EXPECT_EQ(Order.size(), 5u);
-}
-
 TEST(MainThreadQueue, DeliverRunsAtOnceOnTheMainThreadAndQueuesElsewhere) {
   TMainThreadQueue Queue;
   Queue.SetMainThread();
@@ -91,20 +78,6 @@ TEST(MainThreadQueue, KeepsEachPostingThreadsOrder) {
     for (int Index = 0; Index < PerThread; ++Index)
       EXPECT_EQ(ThreadSeen[Index], Index);
   }
-}
-
-TEST(MainThreadQueue, WaitAndProcessWakesForAPostFromAnotherThread) {
-  TMainThreadQueue Queue;
-  Queue.SetMainThread();
-  EXPECT_EQ(Queue.WaitAndProcess(1ms), 0u);
-  bool Ran = false;
-  std::thread Poster([&] { Queue.Post([&] { Ran = true; }); });
-  size_t Count = 0;
-  while (Count == 0)
-    Count = Queue.WaitAndProcess(GenerousWait);
-  Poster.join();
-  EXPECT_EQ(Count, 1u);
-  EXPECT_TRUE(Ran);
 }
 
 TEST(MainThreadQueue, ADeliveryMayPostAndThatDeliveryWaitsForTheNextPump) {

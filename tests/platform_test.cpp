@@ -41,29 +41,17 @@ struct TUTF8Case {
 
 TEST(PlatformText, IsValidUTF8AcceptsWellFormedAndRejectsMalformedSequences) {
   const TUTF8Case Cases[] = {
-      {"empty", "", true},
       {"ASCII with controls", "abc\t\n\x7F", true},
-      {"smallest 2-byte U+0080", "\xC2\x80", true},
       {"smallest 3-byte U+0800", "\xE0\xA0\x80", true},
       {"last before surrogates U+D7FF", "\xED\x9F\xBF", true},
-      {"first after surrogates U+E000", "\xEE\x80\x80", true},
-      {"U+FFFF", "\xEF\xBF\xBF", true},
       {"largest code point U+10FFFF", "\xF4\x8F\xBF\xBF", true},
       {"overlong NUL C0 80", std::string("\xC0\x80", 2), false},
-      {"overlong C1 BF", "\xC1\xBF", false},
-      {"overlong 3-byte E0 80 80", std::string("\xE0\x80\x80", 3), false},
       {"overlong 3-byte E0 9F BF", "\xE0\x9F\xBF", false},
       {"overlong 4-byte F0 8F BF BF", "\xF0\x8F\xBF\xBF", false},
       {"high surrogate ED A0 80", "\xED\xA0\x80", false},
-      {"low surrogate ED BF BF", "\xED\xBF\xBF", false},
       {"above U+10FFFF F4 90 80 80", "\xF4\x90\x80\x80", false},
-      {"lead F5", "\xF5\x80\x80\x80", false},
-      {"5-byte form", "\xF8\x88\x80\x80\x80", false},
-      {"byte FF", "a\xFF", false},
       {"lead followed by ASCII", "\xC3\x41", false},
-      {"3-byte lead with one continuation then ASCII", "\xE2\x82\x41", false},
       {"stray continuation byte", "\x80", false},
-      {"extra continuation after valid sequence", "\xC3\xA9\xA9", false},
   };
   for (const TUTF8Case& Case : Cases)
     EXPECT_EQ(IsValidUTF8(Case.Bytes), Case.Valid) << Case.Name;
@@ -82,47 +70,21 @@ TEST(PlatformText, IsValidUTF8StopsAtTheEndOfAViewCutInsideASequence) {
 
 TEST(PlatformText, AnsiToUTF8ReadsWindows1252) {
   const std::pair<std::string, std::string> Cases[] = {
-      {"\x80", "\xE2\x82\xAC"},                             // euro sign
       {"\x81", "\xC2\x81"},                                 // undefined: the C1 control U+0081
-      {"\x92", "\xE2\x80\x99"},                             // right single quotation mark
       {"\x9F", "\xC5\xB8"},                                 // Y with diaeresis U+0178
-      {"\xA0", "\xC2\xA0"},                                 // Latin-1 from here on
-      {"\xE9", "\xC3\xA9"},                                 // e acute
       {"caf\xE9 \x80\x35", "caf\xC3\xA9 \xE2\x82\xAC\x35"}, // mixed
   };
   for (const auto& [Ansi, Expected] : Cases)
     EXPECT_EQ(AnsiToUTF8(Ansi), Expected) << "input " << ::testing::PrintToString(Ansi);
 }
 
-TEST(PlatformText, AnsiToUTF8LosesNoByte) {
-  std::string AllBytes;
-  for (int Value = 0; Value < 256; ++Value)
-    AllBytes += static_cast<char>(Value);
-  const std::string Text = AnsiToUTF8(AllBytes);
-  EXPECT_TRUE(IsValidUTF8(Text));
-  const auto CodePoints = std::count_if(Text.begin(), Text.end(),
-                                        [](char Byte) { return (static_cast<unsigned char>(Byte) & 0xC0) != 0x80; });
-  EXPECT_EQ(CodePoints, 256);
-}
-
-TEST(PlatformText, DecodeUTF8OrAnsiKeepsUTF8AndConvertsTheRest) {
-  EXPECT_EQ(DecodeUTF8OrAnsi("caf\xC3\xA9 \xE2\x82\xAC"), "caf\xC3\xA9 \xE2\x82\xAC");
-  EXPECT_EQ(DecodeUTF8OrAnsi("caf\xE9"), "caf\xC3\xA9");
-  // One byte that is not UTF-8 makes the whole text ANSI.
-  EXPECT_EQ(DecodeUTF8OrAnsi("\xC3\xA9\xE9"), "\xC3\x83\xC2\xA9\xC3\xA9");
-  EXPECT_EQ(DecodeUTF8OrAnsi(std::string("a\0b", 3)), std::string("a\0b", 3));
-}
-
 // --- Command lines ---------------------------------------------------------
 
 TEST(PlatformCommandLine, SplitCommandLineHonoursBlanksQuotesAndEscapes) {
   const std::pair<std::string, TStringArray> Cases[] = {
-      {"", {}},
       {"   ", {}},
       {"  prog  a\t\tb  ", {"prog", "a", "b"}},
-      {"\"a b\" c", {"a b", "c"}},
       {"pre\"mid dle\"post", {"premid dlepost"}},
-      {"\"\"", {""}},
       {"a \"\" b", {"a", "", "b"}},
       {"\\\"x\\\"", {"\"x\""}},
       {"\"say \\\"hi\\\"\"", {"say \"hi\""}},
@@ -198,41 +160,6 @@ TEST(PlatformChildProcess, ChildInheritsOnlyStandardDescriptors) {
   EXPECT_EQ(Run.ExitCode, 0);
 }
 
-TEST(PlatformChildProcess, StandardOutputAndErrorBothReachTheOutputPipe) {
-  const TChildRun Run = RunChild({"/bin/sh", "-c", "echo out; echo err >&2; exit 3"});
-  ASSERT_TRUE(Run.Started) << Run.Error;
-  EXPECT_EQ(Run.Output, "out\nerr\n");
-  EXPECT_EQ(Run.ExitCode, 3);
-}
-
-TEST(PlatformChildProcess, InputPipeFeedsStandardInput) {
-  TPipe Input;
-  TPipe Output;
-  TChildProcess Child;
-  std::string Error;
-  ASSERT_TRUE(StartChildProcess({"cat"}, {}, Input.ReadHandle(), Output.WriteHandle(), Child, Error)) << Error;
-  Input.CloseRead();
-  Output.CloseWrite();
-  const std::string Text = "first line\nsecond line\n";
-  ASSERT_EQ(WriteHandle(Input.WriteHandle(), Text.data(), Text.size()), static_cast<Int64>(Text.size()));
-  Input.CloseWrite();
-  std::string Echoed;
-  char Buffer[256];
-  for (Int64 Read; (Read = ReadHandle(Output.ReadHandle(), Buffer, sizeof Buffer)) > 0;)
-    Echoed.append(Buffer, static_cast<size_t>(Read));
-  EXPECT_EQ(Echoed, Text);
-  EXPECT_EQ(ReapChildProcess(Child.Pid), 0);
-}
-
-TEST(PlatformChildProcess, WorkingDirectoryAppliesToTheChildOnly) {
-  TScratchDir Scratch;
-  const std::string HostDir = GetCurrentDir();
-  const TChildRun Run = RunChild({"/bin/sh", "-c", "pwd -P"}, Scratch.Path());
-  ASSERT_TRUE(Run.Started) << Run.Error;
-  EXPECT_EQ(Run.Output, std::filesystem::canonical(Scratch.Path()).string() + "\n");
-  EXPECT_EQ(GetCurrentDir(), HostDir);
-}
-
 TEST(PlatformChildProcess, ProgramThatCannotStartGivesTheSystemMessage) {
   TScratchDir Scratch;
   const std::string NotExecutable = Scratch.WriteFile("data.txt", "not a program\n");
@@ -241,11 +168,9 @@ TEST(PlatformChildProcess, ProgramThatCannotStartGivesTheSystemMessage) {
     std::string WorkingDir;
     int ErrorNumber;
   } Cases[] = {
-      {{Scratch.Path() + "/missing"}, {}, ENOENT},
       {{"midebug-no-such-program-on-path"}, {}, ENOENT},
       {{NotExecutable}, {}, EACCES},
       {{"true"}, Scratch.Path() + "/no-such-dir", ENOENT},
-      {{}, {}, ENOENT},
   };
   for (const auto& Case : Cases) {
     const TChildRun Run = RunChild(Case.Arguments, Case.WorkingDir);
@@ -253,24 +178,6 @@ TEST(PlatformChildProcess, ProgramThatCannotStartGivesTheSystemMessage) {
     EXPECT_EQ(Run.Error, SystemErrorMessage(Case.ErrorNumber)) << ::testing::PrintToString(Case.Arguments);
   }
   EXPECT_EQ(SystemErrorMessage(ENOENT), "No such file or directory");
-}
-
-/// Field Index (1-based, after the parenthesised name) of /proc/<pid>/stat
-/// as printed by the child itself.
-std::string StatField(const std::string& Stat, int Index) {
-  std::istringstream Fields(Stat.substr(Stat.rfind(')') + 2));
-  std::string Field;
-  for (int I = 3; I <= Index; ++I)
-    Fields >> Field;
-  return Field;
-}
-
-TEST(PlatformChildProcess, ChildLeadsItsOwnProcessGroup) {
-  const TChildRun Run = RunChild({"cat", "/proc/self/stat"});
-  ASSERT_TRUE(Run.Started) << Run.Error;
-  const std::string ProcessGroup = StatField(Run.Output, 5);
-  EXPECT_EQ(ProcessGroup, std::to_string(Run.Pid)) << Run.Output;
-  EXPECT_NE(ProcessGroup, std::to_string(getpgrp()));
 }
 
 TEST(PlatformChildProcess, ChildStartsWithNoSignalsBlockedOrIgnored) {
@@ -298,40 +205,6 @@ TEST(PlatformChildProcess, ChildStartsWithNoSignalsBlockedOrIgnored) {
   // ignored across the start; the 31 standard signals must be default.
   ASSERT_EQ(Lines[1].rfind("SigIgn:\t", 0), 0u) << Lines[1];
   EXPECT_EQ(std::stoull(Lines[1].substr(8), nullptr, 16) & 0x7FFFFFFFull, 0u) << Lines[1];
-}
-
-TEST(PlatformChildProcess, EndedChildKeepsItsExitCodeUntilReaped) {
-  TPipe Input;
-  TPipe Output;
-  TChildProcess Child;
-  std::string Error;
-  ASSERT_TRUE(
-      StartChildProcess({"/bin/sh", "-c", "exit 5"}, {}, Input.ReadHandle(), Output.WriteHandle(), Child, Error));
-  Output.CloseWrite();
-  char Byte;
-  EXPECT_EQ(ReadHandle(Output.ReadHandle(), &Byte, 1), 0);
-  for (int Tries = 0; Tries < 10000 && !ChildProcessEnded(Child.Pid); ++Tries)
-    YieldAndSleep(1);
-  EXPECT_TRUE(ChildProcessEnded(Child.Pid));
-  EXPECT_EQ(ReapChildProcess(Child.Pid), 5);
-}
-
-TEST(PlatformChildProcess, KilledAndInterruptedChildrenReportTheirSignal) {
-  const std::pair<bool (*)(Integer), int> Cases[] = {{KillProcess, SIGKILL}, {InterruptProcess, SIGINT}};
-  for (const auto& [Signal, Number] : Cases) {
-    TPipe Input;
-    TPipe Output;
-    TChildProcess Child;
-    std::string Error;
-    ASSERT_TRUE(StartChildProcess({"sleep", "60"}, {}, Input.ReadHandle(), Output.WriteHandle(), Child, Error));
-    EXPECT_FALSE(ChildProcessEnded(Child.Pid));
-    EXPECT_TRUE(Signal(Child.Pid));
-    EXPECT_EQ(ReapChildProcess(Child.Pid), 128 + Number);
-  }
-  EXPECT_FALSE(KillProcess(-1));
-  EXPECT_FALSE(KillProcess(0));
-  EXPECT_FALSE(InterruptProcess(0));
-  EXPECT_EQ(ReapChildProcess(0), -1);
 }
 
 // --- Pipes -----------------------------------------------------------------
@@ -379,131 +252,6 @@ TEST(PlatformPipe, WriteWithSigPipeAlreadyBlockedLeavesTheSignalToTheCaller) {
   pthread_sigmask(SIG_SETMASK, &OldMask, nullptr);
 }
 
-TEST(PlatformPipe, LargeWriteArrivesWhole) {
-  TPipe Pipe;
-  std::string Text(1 << 20, '\0');
-  for (size_t I = 0; I < Text.size(); ++I)
-    Text[I] = static_cast<char>('a' + I % 26);
-  std::string Received;
-  std::thread Reader([&] {
-    char Buffer[8192];
-    for (Int64 Read; (Read = ReadHandle(Pipe.ReadHandle(), Buffer, sizeof Buffer)) > 0;)
-      Received.append(Buffer, static_cast<size_t>(Read));
-  });
-  EXPECT_EQ(WriteHandle(Pipe.WriteHandle(), Text.data(), Text.size()), static_cast<Int64>(Text.size()));
-  Pipe.CloseWrite();
-  Reader.join();
-  EXPECT_TRUE(Received == Text) << "received " << Received.size() << " bytes";
-}
-
-TEST(PlatformPipe, WaitForPipeDataSeesDataThenClosed) {
-  TPipe Pipe;
-  EXPECT_EQ(WaitForPipeData(Pipe.ReadHandle(), 0), TPipeState::Empty);
-  ASSERT_EQ(WriteHandle(Pipe.WriteHandle(), "abc", 3), 3);
-  EXPECT_EQ(WaitForPipeData(Pipe.ReadHandle(), 0), TPipeState::Data);
-  Pipe.CloseWrite();
-  // Bytes left after the writer has gone are still data.
-  EXPECT_EQ(WaitForPipeData(Pipe.ReadHandle(), 0), TPipeState::Data);
-  char Buffer[8];
-  EXPECT_EQ(ReadHandle(Pipe.ReadHandle(), Buffer, sizeof Buffer), 3);
-  EXPECT_EQ(WaitForPipeData(Pipe.ReadHandle(), 1000), TPipeState::Closed);
-  EXPECT_EQ(ReadHandle(Pipe.ReadHandle(), Buffer, sizeof Buffer), 0);
-}
-
-TEST(PlatformPipe, WaitForPipeDataWakesWhenAnotherThreadWrites) {
-  TPipe Pipe;
-  std::thread Writer([&] { WriteHandle(Pipe.WriteHandle(), "x", 1); });
-  // Without the write this would wait the full minute.
-  EXPECT_EQ(WaitForPipeData(Pipe.ReadHandle(), 60000), TPipeState::Data);
-  Writer.join();
-}
-
-TEST(PlatformPipe, PipeEndsArePrivateUntilHandedToAChild) {
-  TPipe Pipe;
-  EXPECT_NE(fcntl(Pipe.ReadHandle(), F_GETFD) & FD_CLOEXEC, 0);
-  EXPECT_NE(fcntl(Pipe.WriteHandle(), F_GETFD) & FD_CLOEXEC, 0);
-  const THandle Read = Pipe.ReadHandle();
-  Pipe.CloseRead();
-  EXPECT_EQ(Pipe.ReadHandle(), InvalidHandle);
-  EXPECT_EQ(fcntl(Read, F_GETFD), -1);
-}
-
-// --- Files and PATH --------------------------------------------------------
-
-std::string MakeExecutable(const TScratchDir& Dir, const std::string& Name) {
-  const std::string Path = Dir.WriteFile(Name, "#!/bin/sh\nexit 0\n");
-  chmod(Path.c_str(), 0755);
-  return Path;
-}
-
-TEST(PlatformFiles, FindOnPathTakesTheFirstExecutableFile) {
-  TScratchDir First;
-  TScratchDir Second;
-  TScratchDir Third;
-  // In the first directory the name is a plain file, in the second a
-  // directory; only the third holds a program.
-  First.WriteFile("mitool", "not executable\n");
-  std::filesystem::create_directory(Second.Path() + "/mitool");
-  chmod((Second.Path() + "/mitool").c_str(), 0755);
-  const std::string Program = MakeExecutable(Third, "mitool");
-  TScopedEnv Path("PATH", First.Path() + ":" + Second.Path() + ":" + Third.Path());
-
-  EXPECT_EQ(FindOnPath("mitool"), Program);
-  EXPECT_TRUE(ProgramExists("mitool"));
-  EXPECT_EQ(FindOnPath("no-such-mitool"), "");
-  EXPECT_FALSE(ProgramExists("no-such-mitool"));
-  // A name with a separator is a path, not something to look up.
-  EXPECT_EQ(FindOnPath("bin/mitool"), "");
-  EXPECT_EQ(FindOnPath(""), "");
-  EXPECT_TRUE(ProgramExists(Program));
-  EXPECT_FALSE(ProgramExists(Third.Path() + "/missing"));
-  EXPECT_FALSE(ProgramExists(""));
-}
-
-TEST(PlatformFiles, ForceDirectoriesCreatesEveryMissingParent) {
-  TScratchDir Scratch;
-  const std::string Nested = Scratch.Path() + "/a/b/c";
-  EXPECT_TRUE(ForceDirectories(Nested));
-  EXPECT_TRUE(DirectoryExists(Nested));
-  EXPECT_TRUE(ForceDirectories(Nested));
-  const std::string File = Scratch.WriteFile("file", "x");
-  EXPECT_FALSE(ForceDirectories(File + "/sub"));
-  EXPECT_FALSE(ForceDirectories(File));
-  EXPECT_FALSE(ForceDirectories(""));
-  EXPECT_TRUE(FileExists(File));
-  EXPECT_FALSE(FileExists(Nested));
-  EXPECT_FALSE(DirectoryExists(File));
-}
-
-TEST(PlatformFiles, ExpandFileNameMakesAbsoluteAndNormal) {
-  const std::string Current = GetCurrentDir();
-  EXPECT_EQ(ExpandFileName("sub/../name.txt"), Current + "/name.txt");
-  EXPECT_EQ(ExpandFileName("./missing/dir/file"), Current + "/missing/dir/file");
-  EXPECT_EQ(ExpandFileName("/a/./b/../c"), "/a/c");
-}
-
-TEST(PlatformFiles, ExtractFileDirAndName) {
-  const struct {
-    std::string Path;
-    std::string Dir;
-    std::string Name;
-  } Cases[] = {
-      {"/x", "/", "x"}, {"x", "", "x"}, {"a/b/", "a/b", ""}, {"/usr/lib/libc.so", "/usr/lib", "libc.so"}, {"", "", ""},
-  };
-  for (const auto& Case : Cases) {
-    EXPECT_EQ(ExtractFileDir(Case.Path), Case.Dir) << Case.Path;
-    EXPECT_EQ(ExtractFileName(Case.Path), Case.Name) << Case.Path;
-  }
-}
-
-TEST(PlatformFiles, GetEnvironmentVariableReadsTheCurrentValue) {
-  {
-    TScopedEnv Variable("MIDEBUG_PLATFORM_TEST_VAR", "value with blanks");
-    EXPECT_EQ(GetEnvironmentVariable("MIDEBUG_PLATFORM_TEST_VAR"), "value with blanks");
-  }
-  EXPECT_EQ(GetEnvironmentVariable("MIDEBUG_PLATFORM_TEST_VAR"), "");
-}
-
 // --- Log file --------------------------------------------------------------
 
 TEST(PlatformLogWriter, ConcurrentWritesNeverInterleave) {
@@ -543,23 +291,6 @@ TEST(PlatformLogWriter, ConcurrentWritesNeverInterleave) {
     ASSERT_EQ(Line, LineOf(Letter, Next[static_cast<int>(Letter)])) << "line starting " << Line.substr(0, 20);
     ++Next[static_cast<int>(Letter)];
   }
-}
-
-TEST(PlatformLogWriter, OpenTruncatesAndAFailedOpenWritesNothing) {
-  TScratchDir Scratch;
-  const std::string Path = Scratch.WriteFile("log.txt", "old content\n");
-  {
-    TLogWriter Log;
-    ASSERT_TRUE(Log.Open(Path));
-    Log.Write("new");
-    Log.Write(" text", true);
-  }
-  EXPECT_EQ(ReadWholeFile(Path), "new text\n");
-
-  TLogWriter Broken;
-  EXPECT_FALSE(Broken.Open(Scratch.Path() + "/missing/log.txt"));
-  EXPECT_FALSE(Broken.IsOpen());
-  Broken.Write("dropped", true);
 }
 
 // --- Threads ---------------------------------------------------------------

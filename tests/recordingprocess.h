@@ -1,46 +1,69 @@
 #pragma once
 /// \file
 /// A process for parser tests: records every call the parser makes as one
-/// line of text, and hands out the result objects a test registered.
+/// line of text, keeps the values of the calls a user would see, and hands
+/// out the result objects a test registered.
 
 #include "process/gdbinterfaces.h"
 
+#include <algorithm>
 #include <cstdio>
 #include <map>
 #include <string>
+#include <string_view>
 #include <vector>
 
 namespace midebug::test {
+
+/// One stop as the process heard it.
+struct TStop {
+  TGDBLocation Location;
+  Integer ThreadId = -1;
+  TThreadStopReason Reason = tsrNotStopped;
+};
 
 class TRecordingProcess : public IGDBInternalProcess {
 public:
   // What the process answers.
   bool LLDB = false;
   bool Windows = false;
-  bool Linux = true;
-  bool Android64 = false;
-  bool AttachMode = false;
   bool HXConsole = false;
   bool Dying = false;
   bool BreakpointHandled = false;
   std::string EndOfLineMarker = "(gdb) \n";
   std::map<std::string, TGDBResult*> WaitObjects;
 
-  /// Every call, in order.
+  /// Every call, in order, and the values of the calls that carry records.
   std::vector<std::string> Calls;
-  /// The arguments of the last calls that carry records.
-  TGDBLocation LastLocation;
-  TGDBException LastException;
-  TGDBModule LastModule;
+  std::vector<TStop> Suspensions;
+  std::vector<std::pair<Integer, TStop>> BreakpointHits;
+  std::vector<std::pair<TGDBException, Integer>> Signals;
+  std::vector<TGDBException> Exceptions;
+  std::vector<std::pair<Integer, std::string>> Exits;
+  std::vector<TGDBLogEvent> LogEvents;
+  std::vector<TGDBModule> Modules;
+  std::vector<std::pair<Integer, Integer>> CreatedThreads;
+  std::vector<Integer> ExitedThreads;
+  std::vector<Integer> Pids;
+  Integer Resumptions = 0;
 
   void Register(const std::string& Key, TGDBResult& Result) { WaitObjects[Key] = &Result; }
-
-  static std::string Str(Integer Value) { return std::to_string(Value); }
 
   static std::string Describe(const TGDBLocation& Location) {
     char Address[32];
     std::snprintf(Address, sizeof Address, "%#llx", static_cast<unsigned long long>(Location.Address));
     return Location.Source + ":" + std::to_string(Location.Line) + "@" + (Location.Address ? Address : "0x0");
+  }
+  /// The texts logged with the given kind, in order.
+  std::vector<std::string> Logged(TGDBEvent Kind) const {
+    std::vector<std::string> Texts;
+    for (const TGDBLogEvent& Event : LogEvents)
+      if (Event.Event == Kind)
+        Texts.push_back(Event.Data);
+    return Texts;
+  }
+  bool Called(std::string_view Prefix) const {
+    return std::any_of(Calls.begin(), Calls.end(), [&](const std::string& Call) { return Call.starts_with(Prefix); });
   }
 
   int32_t QueryInterface(const TGUID&, void**) override { return IntfResultNoInterface; }
@@ -48,53 +71,61 @@ public:
   int32_t Release() override { return 1; }
 
   void NotifyLogEvent(const TGDBLogEvent& Event) override {
-    Calls.push_back(std::string("Log(") + Str(static_cast<int>(Event.Event)) + "," + Event.Data + ")");
+    LogEvents.push_back(Event);
+    Record("Log", std::to_string(static_cast<int>(Event.Event)) + "," + Event.Data);
   }
   void NotifyProcessStarted() override { Calls.push_back("Started"); }
   void NotifyProcessExited(Integer Code, const std::string& Signal) override {
-    Calls.push_back(std::string("Exited(") + Str(Code) + "," + Signal + ")");
+    Exits.emplace_back(Code, Signal);
+    Record("Exited", std::to_string(Code) + "," + Signal);
   }
-  void NotifyProcessResumed() override { Calls.push_back("Resumed"); }
-  void NotifyProcessFaulted(const std::string& Message) override { Calls.push_back("Faulted(" + Message + ")"); }
+  void NotifyProcessResumed() override {
+    ++Resumptions;
+    Calls.push_back("Resumed");
+  }
+  void NotifyProcessFaulted(const std::string& Message) override { Record("Faulted", Message); }
   void NotifyProcessSuspended(const TGDBLocation& Location, Integer ThreadId, TThreadStopReason Reason) override {
-    LastLocation = Location;
-    Calls.push_back(std::string("Suspended(") + Describe(Location) + "," + Str(ThreadId) + "," + Str(static_cast<int>(Reason)) + ")");
+    Suspensions.push_back({Location, ThreadId, Reason});
+    Record("Suspended", Describe(Location) + "," + std::to_string(ThreadId) + "," + std::to_string(static_cast<int>(Reason)));
   }
   void NotifySignalReceived(const TGDBException& Signal, Integer ThreadId) override {
-    LastException = Signal;
-    Calls.push_back(std::string("Signal(") + Signal.Name + "," + Signal.Desc + "," + Describe(Signal.Location) + "," + Str(ThreadId) + ")");
+    Signals.emplace_back(Signal, ThreadId);
+    Record("Signal", Signal.Name + "," + Signal.Desc + "," + Describe(Signal.Location) + "," + std::to_string(ThreadId));
   }
   void NotifyExceptionRaised(const TGDBException& Exception, Integer ThreadId) override {
-    LastException = Exception;
-    Calls.push_back(std::string("Exception(") + Exception.Name + "," + Str(ThreadId) + ")");
+    Exceptions.push_back(Exception);
+    Record("Exception", Exception.Name + "," + std::to_string(ThreadId));
   }
   void NotifyThreadCreated(Integer ThreadId, Integer OsId) override {
-    Calls.push_back(std::string("ThreadCreated(") + Str(ThreadId) + "," + Str(OsId) + ")");
+    CreatedThreads.emplace_back(ThreadId, OsId);
+    Record("ThreadCreated", std::to_string(ThreadId) + "," + std::to_string(OsId));
   }
-  void NotifyThreadExited(Integer ThreadId) override { Calls.push_back(std::string("ThreadExited(") + Str(ThreadId) + ")"); }
-  void NotifyThreadSelected(Integer ThreadId) override {
-    Calls.push_back(std::string("ThreadSelected(") + Str(ThreadId) + ")");
+  void NotifyThreadExited(Integer ThreadId) override {
+    ExitedThreads.push_back(ThreadId);
+    Record("ThreadExited", std::to_string(ThreadId));
   }
-  void NotifyProcessPidCreated(Integer Pid) override { Calls.push_back(std::string("Pid(") + Str(Pid) + ")"); }
-  void NotifyLanguageChanged(const std::string& Language) override { Calls.push_back("Language(" + Language + ")"); }
-  void NotifySettingMaxChildrenCountChanged(Integer Count) override {
-    Calls.push_back(std::string("MaxChildren(") + Str(Count) + ")");
+  void NotifyThreadSelected(Integer ThreadId) override { Record("ThreadSelected", std::to_string(ThreadId)); }
+  void NotifyProcessPidCreated(Integer Pid) override {
+    Pids.push_back(Pid);
+    Record("Pid", std::to_string(Pid));
   }
+  void NotifyLanguageChanged(const std::string& Language) override { Record("Language", Language); }
+  void NotifySettingMaxChildrenCountChanged(Integer Count) override { Record("MaxChildren", std::to_string(Count)); }
   void NotifyModuleLoaded(const TGDBModule& Module) override {
-    LastModule = Module;
-    Calls.push_back(std::string("ModuleLoaded(") + Module.Name + ")");
+    Modules.push_back(Module);
+    Record("ModuleLoaded", Module.Name);
   }
   void NotifyModuleUnLoaded(const TGDBModule& Module) override {
-    LastModule = Module;
-    Calls.push_back(std::string("ModuleUnloaded(") + Module.Name + ")");
+    Modules.push_back(Module);
+    Record("ModuleUnloaded", Module.Name);
   }
   bool NotifyBreakpointOccurred(Integer Breakpoint, const TGDBLocation& Location, Integer ThreadId) override {
-    LastLocation = Location;
-    Calls.push_back(std::string("Breakpoint(") + Str(Breakpoint) + "," + Describe(Location) + "," + Str(ThreadId) + ")");
+    BreakpointHits.push_back({Breakpoint, {Location, ThreadId, tsrAtBreakpoint}});
+    Record("Breakpoint", std::to_string(Breakpoint) + "," + Describe(Location) + "," + std::to_string(ThreadId));
     return BreakpointHandled;
   }
   void NotifyBreakpointModified(Integer Breakpoint, const TGDBLocation& Location) override {
-    Calls.push_back(std::string("BreakpointModified(") + Str(Breakpoint) + "," + Describe(Location) + ")");
+    Record("BreakpointModified", std::to_string(Breakpoint) + "," + Describe(Location));
   }
   void NotifyWatchpointOutOfScope() override { Calls.push_back("WatchpointOutOfScope"); }
   void NotifyProcessRestart() override { Calls.push_back("Restart"); }
@@ -108,18 +139,19 @@ public:
   }
   std::string GetEndOfLineMarker() override { return EndOfLineMarker; }
   bool IsLLDB() override { return LLDB; }
-  bool IsAndroid64() override { return Android64; }
-  bool IsLinux() override { return Linux; }
+  bool IsAndroid64() override { return false; }
+  bool IsLinux() override { return !Windows; }
   bool IsWindows() override { return Windows; }
-  bool IsAttachMode() override { return AttachMode; }
+  bool IsAttachMode() override { return false; }
   bool SupportHXConsole() override { return HXConsole; }
   bool IsDying() override { return Dying; }
   Integer GetModuleId(const std::string& Name) override {
-    const auto Found = FModuleIds.try_emplace(Name, static_cast<Integer>(FModuleIds.size()) + 1);
-    return Found.first->second;
+    return FModuleIds.try_emplace(Name, static_cast<Integer>(FModuleIds.size()) + 1).first->second;
   }
 
 private:
+  void Record(const std::string& Name, const std::string& Arguments) { Calls.push_back(Name + "(" + Arguments + ")"); }
+
   std::map<std::string, Integer> FModuleIds;
 };
 

@@ -5,6 +5,7 @@
 
 #include "midebug.h"
 
+#include <algorithm>
 #include <atomic>
 #include <chrono>
 #include <functional>
@@ -18,6 +19,8 @@ class TTestListener : public TInterfaced<IGDBProcessListener> {
 public:
   /// The answers FatalError gives, in turn; the last one repeats.
   std::vector<bool> FatalAnswers{true};
+  /// The answer to SignalReceived.
+  bool StopOnSignal = true;
 
   void ProcessSuspended(Integer ThreadId) override { Record("Suspended(" + std::to_string(ThreadId) + ")"); }
   void ProcessResumed(Integer ThreadId) override { Record("Resumed(" + std::to_string(ThreadId) + ")"); }
@@ -29,7 +32,7 @@ public:
   void ModuleLoaded(const TGDBModule& Module) override { Record("ModuleLoaded(" + Module.Name + ")"); }
   void ModuleUnLoaded(const TGDBModule& Module) override { Record("ModuleUnLoaded(" + Module.Name + ")"); }
   void SignalReceived(bool& ShouldStop, Integer ThreadId, const TGDBException& Signal) override {
-    ShouldStop = true;
+    ShouldStop = StopOnSignal;
     Record("Signal(" + std::to_string(ThreadId) + "," + Signal.Name + ")");
   }
   void ExceptionRaised(bool& ShouldStop, Integer ThreadId, const TGDBException& Exception) override {
@@ -53,12 +56,15 @@ public:
     std::lock_guard Guard(FLock);
     return FCalls;
   }
-  bool HasCall(const std::string& Prefix) const {
+  bool HasCall(const std::string& Prefix) const { return CountOf(Prefix) > 0; }
+  size_t CountOf(const std::string& Prefix) const {
     std::lock_guard Guard(FLock);
-    for (const std::string& Call : FCalls)
-      if (Call.rfind(Prefix, 0) == 0)
-        return true;
-    return false;
+    return static_cast<size_t>(
+        std::count_if(FCalls.begin(), FCalls.end(), [&](const std::string& Call) { return Call.starts_with(Prefix); }));
+  }
+  bool HasCallContaining(const std::string& Text) const {
+    std::lock_guard Guard(FLock);
+    return std::any_of(FCalls.begin(), FCalls.end(), [&](const std::string& Call) { return Call.find(Text) != std::string::npos; });
   }
   /// Pumps the main-thread queue until Done holds or the time runs out.
   bool PumpUntil(const std::function<bool()>& Done, std::chrono::milliseconds Limit = std::chrono::seconds(30)) {

@@ -1,16 +1,69 @@
 #include "testsupport.h"
 
+#include <cstdio>
 #include <cstdlib>
 #include <filesystem>
 #include <fstream>
 #include <sstream>
 #include <stdexcept>
+#include <unistd.h>
 
 namespace midebug::test {
 
 std::string FakeDebuggerPath() { return MIDEBUG_FAKE_MI; }
 
 std::string TestDataDir() { return MIDEBUG_TEST_DATA; }
+
+std::string Debuggee(const std::string& Name) { return std::string(MIDEBUG_DEBUGGEES) + "/" + Name; }
+
+std::string DebuggeeSource(const std::string& FileName) {
+  return std::string(MIDEBUG_DEBUGGEE_SOURCES) + "/" + FileName;
+}
+
+std::string FakeScript(const std::string& Name) { return TestDataDir() + "/fakemi/" + Name; }
+
+namespace {
+
+/// The state letter and parent of a process, from /proc/<pid>/stat.
+bool ReadStat(int Pid, std::string& Name, char& State, int& Parent) {
+  std::ifstream Stat("/proc/" + std::to_string(Pid) + "/stat");
+  std::string Line;
+  std::getline(Stat, Line);
+  const size_t Open = Line.find('(');
+  const size_t Close = Line.rfind(')');
+  if (Open == std::string::npos || Close == std::string::npos)
+    return false;
+  Name = Line.substr(Open + 1, Close - Open - 1);
+  return std::sscanf(Line.c_str() + Close + 1, " %c %d", &State, &Parent) == 2;
+}
+
+} // namespace
+
+std::vector<int> ChildrenNamed(const std::string& Name) {
+  std::vector<int> Found;
+  for (const auto& Entry : std::filesystem::directory_iterator("/proc")) {
+    const int Pid = std::atoi(Entry.path().filename().c_str());
+    std::string Command;
+    char State = 0;
+    int Parent = 0;
+    if (Pid > 0 && ReadStat(Pid, Command, State, Parent) && Parent == getpid() && Command == Name && State != 'Z')
+      Found.push_back(Pid);
+  }
+  return Found;
+}
+
+bool ProcessRuns(int Pid) {
+  std::string Command;
+  char State = 0;
+  int Parent = 0;
+  return ReadStat(Pid, Command, State, Parent) && State != 'Z' && State != 'X';
+}
+
+TFakeOnPath::TFakeOnPath(const std::string& Name, const std::string& Script)
+    : FPath("PATH", FBin.Path() + ":" + std::string(std::getenv("PATH") ? std::getenv("PATH") : "")),
+      FScript("FAKEMI_SCRIPT", FakeScript(Script)) {
+  std::filesystem::copy_file(FakeDebuggerPath(), FBin.Path() + "/" + Name);
+}
 
 std::string ReadWholeFile(const std::string& Path) {
   std::ifstream In(Path, std::ios::binary);

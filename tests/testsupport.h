@@ -7,6 +7,7 @@
 #include "midebug.h"
 
 #include <string>
+#include <vector>
 
 namespace midebug::test {
 
@@ -25,6 +26,22 @@ std::string FakeDebuggerPath();
 
 /// Directory of the committed test data (scripts, transcripts).
 std::string TestDataDir();
+
+/// A program under tests/debuggees, built once by CMake with debug
+/// information; Name is its source's name without the extension.
+std::string Debuggee(const std::string& Name);
+
+/// The source file of a debuggee, e.g. DebuggeeSource("loop.c").
+std::string DebuggeeSource(const std::string& FileName);
+
+/// Living child processes of this test program with the given name.
+std::vector<int> ChildrenNamed(const std::string& Name);
+
+/// Whether Pid names a process that has not ended (a zombie has ended).
+bool ProcessRuns(int Pid);
+
+/// Path of a fake-debugger script under tests/data/fakemi.
+std::string FakeScript(const std::string& Name);
 
 /// A fresh directory under the system's temporary directory, removed when the
 /// object is destroyed.
@@ -55,6 +72,19 @@ private:
   std::string FName;
   std::string FOldValue;
   bool FHadValue;
+};
+
+/// The fake debugger installed as Name ("gdb", "lldb-mi") on a PATH of its
+/// own, playing the given script under tests/data/fakemi, while the object
+/// lives.
+class TFakeOnPath {
+public:
+  TFakeOnPath(const std::string& Name, const std::string& Script);
+
+private:
+  TScratchDir FBin;
+  TScopedEnv FPath;
+  TScopedEnv FScript;
 };
 
 } // namespace midebug::test

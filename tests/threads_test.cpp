@@ -12,34 +12,47 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
-#include <cstdlib>
-#include <regex>
+#include <cctype>
+#include <string_view>
 
 namespace midebug {
 namespace {
 
-using test::TScratchDir;
 using test::TTestListener;
 
 TEST(ThreadsState, StrToStateIgnoresLetterCaseAndGivesNoneForAnythingElse) {
-  const std::vector<std::pair<std::string, TThreadState>> Cases = {
-      {"stopped", tsStop},    {"Stopped", tsStop},     {"STOPPED", tsStop},     {"running", tsRunnable},
-      {"RUNNING", tsRunnable}, {"Waiting", tsBlocked},  {"@@zombie", tsZombie},  {"@@ZOMBIE", tsZombie},
-      {"", tsNone},           {"stopped ", tsNone},    {"zombie", tsNone},      {"exited", tsNone},
+  const std::pair<std::string, TThreadState> Cases[] = {
+      {"Stopped", tsStop}, {"RUNNING", tsRunnable}, {"Waiting", tsBlocked}, {"@@zombie", tsZombie},
+      {"", tsNone},        {"stopped ", tsNone},    {"zombie", tsNone},     {"exited", tsNone},
   };
   for (const auto& [Text, State] : Cases)
     EXPECT_EQ(TGDBThread::StrToState(Text), State) << "'" << Text << "'";
 }
 
-/// A frame header of C and C++: the address in 16 upper-case digits, the
-/// function and its named arguments.
+/// Whether Text matches Pattern, where each '*' stands for any run of
+/// characters.
+bool Glob(std::string_view Text, std::string_view Pattern) {
+  const size_t Star = Pattern.find('*');
+  if (Star == std::string_view::npos)
+    return Text == Pattern;
+  if (!Text.starts_with(Pattern.substr(0, Star)))
+    return false;
+  for (size_t At = Star; At <= Text.size(); ++At)
+    if (Glob(Text.substr(At), Pattern.substr(Star + 1)))
+      return true;
+  return false;
+}
+
+/// A frame header with an address: ':', the address in 16 upper-case
+/// digits, a blank, then the call (a Glob pattern).
 ::testing::AssertionResult IsCHeader(const std::string& Header, const std::string& Call) {
-  static const std::regex Address("^:[0-9A-F]{16} ");
-  if (!std::regex_search(Header, Address))
-    return ::testing::AssertionFailure() << "'" << Header << "' does not start with :ADDRESS";
-  if (Header.substr(18) != Call)
-    return ::testing::AssertionFailure() << "'" << Header << "' does not end in '" << Call << "'";
-  return ::testing::AssertionSuccess();
+  const bool Address = Header.size() > 18 && Header[0] == ':' && Header[17] == ' ' &&
+                       std::all_of(Header.begin() + 1, Header.begin() + 17, [](char Digit) {
+                         return std::isdigit(static_cast<unsigned char>(Digit)) || (Digit >= 'A' && Digit <= 'F');
+                       });
+  if (Address && Glob(Header.substr(18), Call))
+    return ::testing::AssertionSuccess();
+  return ::testing::AssertionFailure() << "'" << Header << "' is not ':ADDRESS " << Call << "'";
 }
 
 UInt64 HeaderAddress(const std::string& Header) { return std::stoull(Header.substr(1, 16), nullptr, 16); }
@@ -48,20 +61,10 @@ class ThreadsTest : public ::testing::Test {
 protected:
   void SetUp() override { SetMainThread(); }
 
-  /// Builds Source with Compiler ("gcc -g -O0 -pthread", "fpc -g"...) and
-  /// returns the program's path, or empty.
-  std::string Build(const std::string& Compiler, const std::string& Name, const std::string& Extension,
-                    const std::string& Source, const std::string& Output = " -o ") {
-    const std::string SourcePath = Scratch.WriteFile(Name + Extension, Source);
-    const std::string Program = Scratch.Path() + "/" + Name;
-    const std::string Command = Compiler + Output + "'" + Program + "' '" + SourcePath + "' >/dev/null";
-    return std::system(Command.c_str()) == 0 ? Program : std::string();
-  }
-
   /// Loads Program under GDB, puts a breakpoint on each of Functions and runs
   /// it to the first stop.
   void Launch(const std::string& Program, TGDBLanguage Language, const std::vector<std::string>& Functions) {
-    Process = TGDBProcessManager::CreateProcess(Listener, Program, "", Scratch.Path(), "local", "Linux64", Language,
+    Process = TGDBProcessManager::CreateProcess(Listener, Program, "", "", "local", "Linux64", Language,
                                                 gcAMD64, "gdb");
     ASSERT_TRUE(Process);
     for (const std::string& Function : Functions)
@@ -82,16 +85,11 @@ protected:
   }
 
 
-  size_t Stops() const {
-    const std::vector<std::string> Calls = Listener->Calls();
-    return static_cast<size_t>(
-        std::count_if(Calls.begin(), Calls.end(), [](const std::string& Call) { return Call.starts_with("Suspended("); }));
-  }
+  size_t Stops() const { return Listener->CountOf("Suspended("); }
 
   TGDBProcess& Core() { return *static_cast<TGDBProcess*>(Process.get()); }
   static TGDBThread& Of(const TIntfPtr<IGDBThread>& Thread) { return *static_cast<TGDBThread*>(Thread.get()); }
 
-  TScratchDir Scratch;
   TIntfPtr<TTestListener> Listener{new TTestListener};
   TIntfPtr<IGDBProcess> Process;
 
@@ -99,23 +97,9 @@ private:
   size_t FStops = 0;
 };
 
-/// The worker stops in inner, called from outer(1, 2), while main waits for
-/// it in finish, called from line 12 whichever way the two threads race.
-const char* const ThreadedC = R"(#include <pthread.h>
-static volatile int Sink, Waiting;
-static void ready(void) { Sink = 0; }
-static int inner(int x) { Sink = x; return x * 2; }
-static int outer(int a, int b) { return inner(a + b); }
-static void *worker(void *arg) { (void)arg; while (!Waiting) {} outer(1, 2); return 0; }
-static void finish(pthread_t t) { Waiting = 1; pthread_join(t, 0); }
-int main(int argc, char **argv) {
-  pthread_t t;
-  ready();
-  pthread_create(&t, 0, worker, 0);
-  finish(t);
-  return argc - 1;
-}
-)";
+// tests/debuggees/threaded.c: the worker stops in inner, called from
+// outer(1, 2), while main waits for it in finish, called from line 12
+// whichever way the two threads race.
 
 /// The threaded C program stopped in inner on the worker thread (2), with
 /// both threads in the process's table.
@@ -123,9 +107,7 @@ class ThreadsInC : public ThreadsTest {
 protected:
   void SetUp() override {
     ThreadsTest::SetUp();
-    const std::string Program = Build("gcc -g -O0 -pthread", "threaded", ".c", ThreadedC);
-    ASSERT_FALSE(Program.empty());
-    ASSERT_NO_FATAL_FAILURE(Launch(Program, glC, {"ready", "inner"}));
+    ASSERT_NO_FATAL_FAILURE(Launch(test::Debuggee("threaded"), glC, {"ready", "inner"}));
     MainThread = Process->GetThread(1);
     ASSERT_FALSE(Of(MainThread).ZombieState());
     ASSERT_NO_FATAL_FAILURE(Continue());
@@ -165,7 +147,7 @@ TEST_F(ThreadsInC, StoppedThreadShowsItsCallsWithNamedArgumentsInnermostFirst) {
   EXPECT_EQ(Worker->GetCallCount(), Count) << "the count after the fetch is the number of frames fetched";
 }
 
-TEST_F(ThreadsInC, FrameNumbersOutsideTheStackGiveEmptyValues) {
+TEST_F(ThreadsInC, FramesOutsideTheStackGiveEmptyValuesAndCannotBeSelected) {
   const Integer Count = Worker->GetCallCount();
   for (const Integer Index : {0, -1, Count + 1, 10000}) {
     EXPECT_EQ(Worker->GetCallHeader(Index), "") << Index;
@@ -173,6 +155,14 @@ TEST_F(ThreadsInC, FrameNumbersOutsideTheStackGiveEmptyValues) {
     EXPECT_TRUE(Of(Worker).GetCallParams(Index).empty()) << Index;
   }
   EXPECT_NE(Worker->GetCallHeader(Count), "");
+
+  // Selecting a frame outside the stack changes nothing.
+  Of(Worker).SelectFrame(2);
+  for (const Integer Frame : {0, -3, Count + 1}) {
+    Of(Worker).SelectFrame(Frame);
+    EXPECT_EQ(Of(Worker).FFrameIndex, 1) << Frame;
+  }
+  EXPECT_EQ(Core().Threads().CurrentLocation().Line, 5) << "still in outer";
 }
 
 TEST_F(ThreadsInC, AnotherThreadsStackIsItsOwnAndSelectingItMovesTheDebugger) {
@@ -180,8 +170,7 @@ TEST_F(ThreadsInC, AnotherThreadsStackIsItsOwnAndSelectingItMovesTheDebugger) {
   const Integer Main = FrameOf(MainThread, "main");
   ASSERT_GT(Main, 1) << "main waits in pthread_join";
   EXPECT_EQ(Process->GetSuspendedThreadId(), 1);
-  EXPECT_TRUE(IsCHeader(MainThread->GetCallHeader(Main), MainThread->GetCallHeader(Main).substr(18)));
-  EXPECT_TRUE(MainThread->GetCallHeader(Main).substr(18).starts_with("main(argc=1, argv=0x"));
+  EXPECT_TRUE(IsCHeader(MainThread->GetCallHeader(Main), "main(argc=1, argv=0x*)"));
   EXPECT_EQ(FrameOf(MainThread, "inner"), 0);
   EXPECT_EQ(MainThread->GetCallLocation(Main).Line, 12);
 
@@ -210,17 +199,6 @@ TEST_F(ThreadsInC, SelectedFrameIsWhereTheDebuggerActsUntilTheThreadIsSelectedAg
       << "back at the innermost frame in the debugger";
 }
 
-TEST_F(ThreadsInC, FrameSelectionOutsideTheStackChangesNothing) {
-  const Integer Count = Worker->GetCallCount();
-  Of(Worker).SelectFrame(2);
-  ASSERT_EQ(Of(Worker).FFrameIndex, 1);
-  for (const Integer Frame : {0, -3, Count + 1}) {
-    Of(Worker).SelectFrame(Frame);
-    EXPECT_EQ(Of(Worker).FFrameIndex, 1) << Frame;
-  }
-  EXPECT_EQ(Core().Threads().CurrentLocation().Line, 5) << "still in outer";
-}
-
 TEST_F(ThreadsInC, UnknownThreadNumbersGiveTheZombieWhichHasNoStack) {
   const TIntfPtr<IGDBThread> Unknown = Process->GetThread(99);
   EXPECT_EQ(Unknown->GetState(), tsZombie);
@@ -228,36 +206,18 @@ TEST_F(ThreadsInC, UnknownThreadNumbersGiveTheZombieWhichHasNoStack) {
   EXPECT_EQ(Unknown->GetCallHeader(1), "");
   EXPECT_EQ(Process->GetSuspendedThreadId(), 2) << "asking the zombie does not move the debugger";
   EXPECT_TRUE(IsCHeader(Worker->GetCallHeader(1), "inner(x=3)"));
-
-  // Nor does it show whatever thread the debugger is on when the process
-  // has no current thread.
-  Core().NotifyThreadExited(1);
-  Core().Threads().Select(1);
-  ASSERT_EQ(Process->GetSuspendedThreadId(), -1);
-  EXPECT_EQ(Unknown->GetCallCount(), 0);
-  EXPECT_EQ(Unknown->GetCallHeader(1), "");
 }
 
-TEST_F(ThreadsInC, SelectingThreadsTheDebuggerOrTheTableDoesNotKnow) {
+TEST_F(ThreadsInC, SelectingAThreadTheDebuggerDoesNotKnowChangesNothing) {
   // GDB refuses a number it does not know: its current thread stays, and so
   // does the process's.
   Core().Threads().Select(7);
   EXPECT_EQ(Process->GetSuspendedThreadId(), 2);
-
-  // A thread GDB knows but the table does not leaves no current thread.
-  Core().NotifyThreadExited(1);
   Core().Threads().Select(1);
-  EXPECT_EQ(Process->GetSuspendedThreadId(), -1);
-
+  EXPECT_EQ(Process->GetSuspendedThreadId(), 1);
   Core().Threads().Select(2);
   EXPECT_EQ(Process->GetSuspendedThreadId(), 2);
   EXPECT_EQ(Worker->GetCurrentLocation().Line, 4);
-}
-
-TEST_F(ThreadsInC, ThreadsKnowTheirNamesAndStatesAtAStop) {
-  EXPECT_EQ(MainThread->GetState(), tsStop);
-  EXPECT_EQ(Worker->GetState(), tsStop);
-  EXPECT_NE(MainThread->GetName(), "");
 }
 
 TEST_F(ThreadsInC, SteppingAThreadStepsThatThreadEvenWhenAnotherIsCurrent) {
@@ -277,21 +237,8 @@ TEST_F(ThreadsInC, ARunningProgramsThreadsReportNoStopReason) {
   EXPECT_EQ(Worker->GetStopReason(), tsrNotStopped);
 }
 
-const char* const NestedCpp = R"(struct Calc {
-  int base;
-  int twice(int n) { return base + n * 2; }
-};
-static int apply(Calc &c, int n) { return c.twice(n); }
-int main() {
-  Calc c{1};
-  return apply(c, 21) == 43 ? 0 : 1;
-}
-)";
-
 TEST_F(ThreadsTest, CppFramesShowQualifiedNamesAndEmptyParenthesesWithoutArguments) {
-  const std::string Program = Build("g++ -g -O0", "nested", ".cpp", NestedCpp);
-  ASSERT_FALSE(Program.empty());
-  ASSERT_NO_FATAL_FAILURE(Launch(Program, glCPP, {"Calc::twice"}));
+  ASSERT_NO_FATAL_FAILURE(Launch(test::Debuggee("nested"), glCPP, {"Calc::twice"}));
   const TIntfPtr<IGDBThread> Thread = Process->GetThread(1);
   Core().Threads().Select(1);
   ASSERT_EQ(Process->GetSuspendedThreadId(), 1);
@@ -299,37 +246,14 @@ TEST_F(ThreadsTest, CppFramesShowQualifiedNamesAndEmptyParenthesesWithoutArgumen
 
   ASSERT_EQ(Thread->GetCallCount(), 3);
   const std::string Twice = Thread->GetCallHeader(1);
-  EXPECT_TRUE(std::regex_match(Twice, std::regex(":[0-9A-F]{16} Calc::twice\\(this=0x[0-9a-f]+, n=21\\)"))) << Twice;
-  EXPECT_TRUE(std::regex_match(Thread->GetCallHeader(2),
-                               std::regex(":[0-9A-F]{16} apply\\(c=@0x[0-9a-f]+: \\{base = 1\\}, n=21\\)")))
-      << Thread->GetCallHeader(2);
+  EXPECT_TRUE(IsCHeader(Twice, "Calc::twice(this=0x*, n=21)"));
+  EXPECT_TRUE(IsCHeader(Thread->GetCallHeader(2), "apply(c=@0x*: {base = 1}, n=21)"));
   EXPECT_TRUE(IsCHeader(Thread->GetCallHeader(3), "main()"));
   EXPECT_EQ(Thread->GetCallLocation(3).Line, 8);
 }
 
-const char* const CallsPascal = R"(program calls;
-function Add(A, B: Integer): Integer;
-begin
-  Add := A + B;
-end;
-procedure Show;
-begin
-  WriteLn(Add(1, 2));
-end;
-procedure Bye;
-begin
-  WriteLn('bye');
-end;
-begin
-  AddExitProc(@Bye);
-  Show;
-end.
-)";
-
 TEST_F(ThreadsTest, PascalFramesShowArgumentValuesAndAnAddressWhereSourceIsMissing) {
-  const std::string Program = Build("fpc -g", "calls", ".pas", CallsPascal, " -o");
-  ASSERT_FALSE(Program.empty());
-  ASSERT_NO_FATAL_FAILURE(Launch(Program, glPascal, {"ADD", "BYE"}));
+  ASSERT_NO_FATAL_FAILURE(Launch(test::Debuggee("calls"), glPascal, {"ADD", "BYE"}));
   TIntfPtr<IGDBThread> Thread = Process->GetThread(1);
   Core().Threads().Select(1);
 
@@ -346,7 +270,7 @@ TEST_F(ThreadsTest, PascalFramesShowArgumentValuesAndAnAddressWhereSourceIsMissi
   EXPECT_EQ(Process->GetSuspendedThreadId(), 1);
   EXPECT_EQ(Thread->GetCallHeader(1), "BYE");
   const std::string Runtime = Thread->GetCallHeader(2);
-  EXPECT_TRUE(std::regex_match(Runtime, std::regex(":[0-9A-F]{16} SYSTEM_\\$\\$_DOEXITPROC"))) << Runtime;
+  EXPECT_TRUE(IsCHeader(Runtime, "SYSTEM_$$_DOEXITPROC"));
   EXPECT_EQ(HeaderAddress(Runtime), Thread->GetCallLocation(2).Address);
 }
 

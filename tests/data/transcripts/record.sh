@@ -1,6 +1,6 @@
 #!/bin/sh
 # Records the GDB/MI transcripts of this directory: compiles the programs
-# under programs/ into a scratch directory, feeds each NAME.commands file to
+# under tests/debuggees/ into a scratch directory, feeds each NAME.commands file to
 # "gdb --nx --interpreter=mi2" and keeps everything GDB and the program print
 # on their shared standard output, byte for byte, in NAME.mi.
 #
@@ -51,7 +51,7 @@ record() {
   commands="$here/$name.commands"
   program=$(sed -n '1s/^# program: *//p' "$commands")
   [ -n "$program" ] || { echo "record.sh: $commands names no program" >&2; exit 1; }
-  cp "$here/programs/$program" "$scratch/$program"
+  cp "$here/../../debuggees/$program" "$scratch/$program"
   binary="$scratch/${program%.*}"
   compile "$scratch/$program" "$binary"
   grep -v '^#' "$commands" | sed "s|@BIN@|$binary|g" | expand_lines "$scratch/$program" >"$scratch/$name.in"
