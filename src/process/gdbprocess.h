@@ -136,7 +136,6 @@ public:
   /// True once the run-to-main breakpoint is placed.
   bool CanSetRunToMainBreakpoint() const { return FBreakOnMain != nullptr; }
 
-  /// The threads, their stops and stacks (src/inspect/gdbthreadtable.h).
   TGDBThreadTable& Threads() { return *FThreads; }
   TGDBKernel& Kernel() { return *FKernel; }
   TGDBCPU CPU() const { return FRequests.CPU(); }
@@ -171,6 +170,9 @@ private:
   /// Resumes an asynchronous target paused inside the process, unheard.
   void ASyncTargetResume();
   TGDBLanguage GetCurrentLanguage();
+  /// A signal (tsrSignal) or language exception (tsrExceptRaised) stopped
+  /// the program: an Expected one is a plain stop, else the IDE decides.
+  void NotifyInterruption(const TGDBException& Event, Integer ThreadId, bool Expected, TThreadStopReason Reason);
 
   // Defined in src/inspect beside the components they use.
   void MakeInspectComponents();

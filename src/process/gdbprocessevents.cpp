@@ -107,50 +107,39 @@ void TGDBProcess::NotifyProcessSuspended(const TGDBLocation& Location, Integer T
 }
 
 void TGDBProcess::NotifySignalReceived(const TGDBException& SignalException, Integer ThreadId) {
-  FSuspended = true;
   const bool Expected = SignalException.Name == "SIGINT" || SignalException.Name == "SIGSTOP" ||
                         SignalException.Name == "SIGTRAP";
+  NotifyInterruption(SignalException, ThreadId, Expected, tsrSignal);
+}
+
+void TGDBProcess::NotifyExceptionRaised(const TGDBException& LanguageException, Integer ThreadId) {
+  NotifyInterruption(LanguageException, ThreadId, LanguageException.Name == "0x80000003", tsrExceptRaised);
+}
+
+void TGDBProcess::NotifyInterruption(const TGDBException& Event, Integer ThreadId, bool Expected,
+                                     TThreadStopReason Reason) {
+  FSuspended = true;
+  // A pause the process asked for, or the debugger's own stop before the
+  // program reached its entry point, is a stop like a finished step.
   if ((FSuspending || !FStoppedAtEntryPoint) && Expected) {
     FSuspending = false;
     if (FInternalPause)
       YieldAndSleep(WaitPolicy().PollMs);
     else if (!FDying)
-      NotifyProcessSuspended(SignalException.Location, ThreadId, tsrStepDone);
+      NotifyProcessSuspended(Event.Location, ThreadId, tsrStepDone);
     return;
   }
   FSuspending = false;
-  DeferIfLive([this, SignalException, ThreadId] {
+  DeferIfLive([this, Event, ThreadId, Reason] {
     EnsureThreadCreated(ThreadId);
-    SetCurrentSuspendedThread(ThreadId, SignalException.Location);
+    SetCurrentSuspendedThread(ThreadId, Event.Location);
     bool ShouldStop = false;
-    if (ThreadId != -1 && FProcessListener)
-      FProcessListener->SignalReceived(ShouldStop, ThreadId, SignalException);
+    if (Reason == tsrSignal && ThreadId != -1 && FProcessListener)
+      FProcessListener->SignalReceived(ShouldStop, ThreadId, Event);
+    else if (Reason == tsrExceptRaised && FProcessListener)
+      FProcessListener->ExceptionRaised(ShouldStop, ThreadId, Event);
     if (ShouldStop)
-      NotifyProcessSuspended(SignalException.Location, ThreadId, tsrSignal);
-    else
-      Resume();
-  });
-}
-
-void TGDBProcess::NotifyExceptionRaised(const TGDBException& LanguageException, Integer ThreadId) {
-  FSuspended = true;
-  if ((FSuspending || !FStoppedAtEntryPoint) && LanguageException.Name == "0x80000003") {
-    FSuspending = false;
-    if (FInternalPause)
-      YieldAndSleep(WaitPolicy().PollMs);
-    else if (!FDying)
-      NotifyProcessSuspended(LanguageException.Location, ThreadId, tsrStepDone);
-    return;
-  }
-  FSuspending = false;
-  DeferIfLive([this, LanguageException, ThreadId] {
-    EnsureThreadCreated(ThreadId);
-    SetCurrentSuspendedThread(ThreadId, LanguageException.Location);
-    bool ShouldStop = false;
-    if (FProcessListener)
-      FProcessListener->ExceptionRaised(ShouldStop, ThreadId, LanguageException);
-    if (ShouldStop)
-      NotifyProcessSuspended(LanguageException.Location, ThreadId, tsrExceptRaised);
+      NotifyProcessSuspended(Event.Location, ThreadId, Reason);
     else
       Resume();
   });
