@@ -24,7 +24,6 @@ constexpr const char* TestProfileName = "scripted-agent";
 /// ("<channel number> <operation> <arguments>"), shared by its channels.
 struct TScriptedAgent {
   bool ConnectSucceeds = true;
-  bool StartSucceeds = true;
   Integer Id = 7;
   Int64 EntryPoint = 0x401000;
   Int64 Capabilities = 0;
@@ -69,7 +68,7 @@ public:
     EntryPoint = FAgent->EntryPoint;
     Capabilities = FAgent->Capabilities;
     LLDBInitFile = FAgent->InitFile;
-    return FAgent->StartSucceeds;
+    return true;
   }
   bool GDBSendRequest(Integer Id, const std::string& Command) override {
     FAgent->Record(FName + " send " + std::to_string(Id) + " " + Command);
@@ -138,18 +137,6 @@ protected:
 
 using TCalls = std::vector<std::string>;
 
-TEST_F(RemoteKernel, BeforeStartHasNoCapabilitiesAndIgnoresSettingThem) {
-  Agent->Capabilities = capThreadNotification | capIsLinux;
-  TGDBRemoteKernel Kernel(TestProfileName, "gdb", 3);
-  EXPECT_EQ(Kernel.GetCapabilities(), 0);
-  Kernel.SetCapabilites(capIsWindows);
-  EXPECT_FALSE(Kernel.IsWindows());
-  ASSERT_TRUE(Kernel.Start());
-  EXPECT_EQ(Kernel.GetCapabilities(), capThreadNotification | capIsLinux);
-  Kernel.SetCapabilites(capIsLLDB);
-  EXPECT_TRUE(Kernel.IsLLDB());
-}
-
 TEST_F(RemoteKernel, StartHandsTheAgentItsArgumentsAndKeepsWhatItReturns) {
   Agent->Capabilities = capIsLLDB | capThreadNotification;
   Agent->InitFile = "/opt/lldb/.lldbinit";
@@ -174,59 +161,6 @@ TEST_F(RemoteKernel, StartHandsTheAgentItsArgumentsAndKeepsWhatItReturns) {
 
   Kernel.reset();
   EXPECT_EQ(Agent->TakeCalls(), (TCalls{"2 stop 7", "2 free", "1 free"}));
-}
-
-TEST_F(RemoteKernel, WindowsTargetGetsItsBitsEvenFromAnAgentThatReportsNone) {
-  Agent->Capabilities = 0;
-  TGDBRemoteKernel Kernel(TestProfileName, "lldb-mi", 0);
-  Kernel.FKernelType = 2 | 4 | ktWindowsTarget;
-  ASSERT_TRUE(Kernel.Start());
-  EXPECT_EQ(Kernel.GetCapabilities(),
-            capIsWindows | capStopOnEntryPoint | capExecAbortCommand | capExecInterruptCommand);
-}
-
-TEST_F(RemoteKernel, AgentRefusingToStartKeepsItsAnswersAndIsStoppedOnDestruction) {
-  Agent->StartSucceeds = false;
-  Agent->Id = 9;
-  Agent->Capabilities = capIsLinux;
-  auto Kernel = std::make_unique<TGDBRemoteKernel>(TestProfileName, "gdb", 0);
-  EXPECT_FALSE(Kernel->Start());
-  EXPECT_TRUE(Kernel->IsLinux());
-  EXPECT_EQ(Kernel->GetLastError(false), "error of channel 2");
-  Agent->TakeCalls();
-  Kernel.reset();
-  EXPECT_EQ(Agent->TakeCalls(), (TCalls{"2 stop 9", "2 free", "1 free"}));
-}
-
-TEST_F(RemoteKernel, FailedLookupsLeaveAKernelThatFailsQuietlyAndIsNeverStopped) {
-  auto Kernel = std::make_unique<TGDBRemoteKernel>("no-such-profile", "gdb", 0);
-  EXPECT_FALSE(Kernel->Start());
-  EXPECT_EQ(Kernel->GetLastError(false), "no remote profile 'no-such-profile'");
-  // Nothing to read from and nothing to write to: failures, not crashes.
-  std::string Reply = "stale";
-  EXPECT_FALSE(Kernel->GetReply(Reply));
-  EXPECT_EQ(Reply, "");
-  EXPECT_FALSE(Kernel->SendRequest("1-gdb-version"));
-  Kernel->Interrupt(1);
-  Kernel->Terminate(1);
-  Kernel->Log("text", false);
-  Kernel.reset();
-  EXPECT_TRUE(Agent->TakeCalls().empty());
-
-  // Any object that does not offer the channel factory will do.
-  Profiles()->AddProfile("not-an-agent", CreateRemoteProfileServices());
-  TGDBRemoteKernel NoFactory("not-an-agent", "gdb", 0);
-  EXPECT_FALSE(NoFactory.Start());
-  EXPECT_EQ(NoFactory.GetLastError(false), "remote profile 'not-an-agent' offers no channels");
-  Profiles()->RemoveProfile("not-an-agent");
-
-  const TIntfPtr<IInterface> Saved = VantageIDEServices().GetService(IRemoteProfileServices::IID);
-  VantageIDEServices().UnregisterService(IRemoteProfileServices::IID);
-  TGDBRemoteKernel NoService(TestProfileName, "gdb", 0);
-  const bool Started = NoService.Start();
-  VantageIDEServices().RegisterService(IRemoteProfileServices::IID, Saved);
-  EXPECT_FALSE(Started);
-  EXPECT_EQ(NoService.GetLastError(false), "no remote profile service");
 }
 
 TEST_F(RemoteKernel, ChannelThatDoesNotConnectFailsBeforeTheAgentIsAsked) {
