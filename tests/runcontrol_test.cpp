@@ -97,15 +97,6 @@ protected:
   size_t StopsSeen = 0;
 };
 
-TEST_F(RunControl, RunReportsTheExitCode) {
-  Launch(Debuggee("stepping"));
-  Process->Run();
-  EXPECT_GT(Process->GetPid(), 1);
-  ASSERT_TRUE(Listener->PumpUntilCall("Exited("));
-  EXPECT_TRUE(Listener->HasCall("Exited(2,"));
-  EXPECT_FALSE(Listener->HasCall("Suspended("));
-}
-
 struct TMainCase {
   const char* Program;
   TGDBLanguage Language;
@@ -195,16 +186,6 @@ TEST_F(RunControl, StepsReachTheListenerWithThreadLocationAndReason) {
   Process->Resume();
   ASSERT_TRUE(Listener->PumpUntilCall("Exited("));
   EXPECT_TRUE(Listener->HasCall("Exited(2,"));
-}
-
-TEST_F(RunControl, RunToEntryPointStopsAtMain) {
-  Launch(Debuggee("stepping"));
-  Process->RunToEntryPoint();
-  ASSERT_TRUE(NextStop());
-  EXPECT_EQ(StopReason(), tsrAtBreakpoint);
-  EXPECT_EQ(StopLocation().Line, MainFirstLine);
-  Process->Terminate();
-  EXPECT_TRUE(Listener->PumpUntilCall("Exited(0,"));
 }
 
 TEST_F(RunControl, PauseOfABusyLoopIsAStepStopAndResumeContinues) {
@@ -362,29 +343,6 @@ TEST_F(RunControl, LaunchThatCannotExecTheProgramEndsWithTheDebuggersReason) {
   EXPECT_TRUE(Listener->HasCallContaining("During startup program exited with code 126."));
   EXPECT_FALSE(ProcessOf(Process).Alive());
   EXPECT_TRUE(ReleaseAndCheckDebuggerGone());
-}
-
-TEST_F(RunControl, DebuggerDyingEndsTheSessionWithoutHanging) {
-  // GDB 13 hits a fatal signal on a variable object of a whole Pascal array.
-  Launch(Debuggee("arr"), glPascal);
-  ASSERT_TRUE(Process->SetRunToMainBreakpoint());
-  Process->Run();
-  ASSERT_TRUE(NextStop());
-  const Integer Pid = Process->GetPid();
-  TGDBProcess& Core = ProcessOf(Process);
-  TVarCreateResult Variable;
-  Core.ProcessSyncRequest("0350000000901", "0350000000901-var-create - * \"a\"", Variable);
-  EXPECT_FALSE(Variable.FAvailable && !Variable.FError);
-  ASSERT_TRUE(Listener->PumpUntilCall("Exited("));
-  EXPECT_TRUE(Listener->HasCall("InternalError(Connection to GDB kernel is no longer available"));
-  EXPECT_FALSE(Core.Alive());
-  // Nothing waits for the lost debugger any more.
-  TStackInfoDepthResult Depth;
-  Core.ProcessSyncRequest("0300000000902", "0300000000902-stack-info-depth", Depth);
-  EXPECT_FALSE(Depth.FAvailable && !Depth.FError);
-  EXPECT_TRUE(ReleaseAndCheckDebuggerGone());
-  // The program does not outlive its debugger.
-  EXPECT_TRUE(Listener->PumpUntil([&] { return !ProcessRuns(Pid); }));
 }
 
 // --- The scripted fake debugger -------------------------------------------------
