@@ -42,10 +42,6 @@ public:
   std::vector<std::pair<Integer, std::string>> Exits;
   std::vector<TGDBLogEvent> LogEvents;
   std::vector<TGDBModule> Modules;
-  std::vector<std::pair<Integer, Integer>> CreatedThreads;
-  std::vector<Integer> ExitedThreads;
-  std::vector<Integer> Pids;
-  Integer Resumptions = 0;
 
   void Register(const std::string& Key, TGDBResult& Result) { WaitObjects[Key] = &Result; }
 
@@ -79,10 +75,7 @@ public:
     Exits.emplace_back(Code, Signal);
     Record("Exited", std::to_string(Code) + "," + Signal);
   }
-  void NotifyProcessResumed() override {
-    ++Resumptions;
-    Calls.push_back("Resumed");
-  }
+  void NotifyProcessResumed() override { Calls.push_back("Resumed"); }
   void NotifyProcessFaulted(const std::string& Message) override { Record("Faulted", Message); }
   void NotifyProcessSuspended(const TGDBLocation& Location, Integer ThreadId, TThreadStopReason Reason) override {
     Suspensions.push_back({Location, ThreadId, Reason});
@@ -97,18 +90,11 @@ public:
     Record("Exception", Exception.Name + "," + std::to_string(ThreadId));
   }
   void NotifyThreadCreated(Integer ThreadId, Integer OsId) override {
-    CreatedThreads.emplace_back(ThreadId, OsId);
     Record("ThreadCreated", std::to_string(ThreadId) + "," + std::to_string(OsId));
   }
-  void NotifyThreadExited(Integer ThreadId) override {
-    ExitedThreads.push_back(ThreadId);
-    Record("ThreadExited", std::to_string(ThreadId));
-  }
+  void NotifyThreadExited(Integer ThreadId) override { Record("ThreadExited", std::to_string(ThreadId)); }
   void NotifyThreadSelected(Integer ThreadId) override { Record("ThreadSelected", std::to_string(ThreadId)); }
-  void NotifyProcessPidCreated(Integer Pid) override {
-    Pids.push_back(Pid);
-    Record("Pid", std::to_string(Pid));
-  }
+  void NotifyProcessPidCreated(Integer Pid) override { Record("Pid", std::to_string(Pid)); }
   void NotifyLanguageChanged(const std::string& Language) override { Record("Language", Language); }
   void NotifySettingMaxChildrenCountChanged(Integer Count) override { Record("MaxChildren", std::to_string(Count)); }
   void NotifyModuleLoaded(const TGDBModule& Module) override {
