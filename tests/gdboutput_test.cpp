@@ -387,6 +387,9 @@ TEST(ParserStreams, RecordGluedToProgramOutputIsProcessed) {
        {LogUnknown("no-newline-output"), "ModuleLoaded(a.so)"}},
       {"tail*stopped,reason=\"exited-normally\"\n", {LogUnknown("tail"), "Exited(0,)"}},
       {"a=b, x*y\n", {LogUnknown("a=b, x*y\n")}},
+      // A breakpoint record is not split off: GDB 13 glued one behind a
+      // program's "total=7", and the line is the program's.
+      {"total=7=breakpoint-modified,bkpt={number=\"3\"}\n", {LogUnknown("total=7=breakpoint-modified,bkpt={number=\"3\"}\n")}},
       {"press ^error\n", {LogUnknown("press ^error\n")}},
   };
   for (const TCase& Case : Cases)

@@ -40,7 +40,6 @@ public:
   std::vector<std::pair<TGDBException, Integer>> Signals;
   std::vector<TGDBException> Exceptions;
   std::vector<std::pair<Integer, std::string>> Exits;
-  std::vector<TGDBLogEvent> LogEvents;
   std::vector<TGDBModule> Modules;
 
   void Register(const std::string& Key, TGDBResult& Result) { WaitObjects[Key] = &Result; }
@@ -49,14 +48,6 @@ public:
     char Address[32];
     std::snprintf(Address, sizeof Address, "%#llx", static_cast<unsigned long long>(Location.Address));
     return Location.Source + ":" + std::to_string(Location.Line) + "@" + (Location.Address ? Address : "0x0");
-  }
-  /// The texts logged with the given kind, in order.
-  std::vector<std::string> Logged(TGDBEvent Kind) const {
-    std::vector<std::string> Texts;
-    for (const TGDBLogEvent& Event : LogEvents)
-      if (Event.Event == Kind)
-        Texts.push_back(Event.Data);
-    return Texts;
   }
   bool Called(std::string_view Prefix) const {
     return std::any_of(Calls.begin(), Calls.end(), [&](const std::string& Call) { return Call.starts_with(Prefix); });
@@ -67,7 +58,6 @@ public:
   int32_t Release() override { return 1; }
 
   void NotifyLogEvent(const TGDBLogEvent& Event) override {
-    LogEvents.push_back(Event);
     Record("Log", std::to_string(static_cast<int>(Event.Event)) + "," + Event.Data);
   }
   void NotifyProcessStarted() override { Calls.push_back("Started"); }

@@ -1,7 +1,7 @@
 /// \file
 /// Real GDB 13 transcripts (tests/data/transcripts, recorded by record.sh
 /// there) fed to the output parser block by block, as the kernel hands them
-/// over. TranscriptEvents pins down the stops, notifications and streams a
+/// over. TranscriptEvents pins down the stops and notifications a
 /// user sees; TranscriptDecoders the replies in the stream whose shapes the
 /// decoder tests' recorded replies do not already show.
 
@@ -23,7 +23,6 @@ namespace midebug::test {
 namespace {
 
 using ::testing::ElementsAre;
-using ::testing::StartsWith;
 
 /// The prompt line that ends each reply block of GDB's MI output.
 constexpr std::string_view GDBPrompt = "(gdb) \n";
@@ -92,7 +91,8 @@ TEST(TranscriptEvents, StopsOfBreakpointsStepsFinishAndWatchpointsInOrder) {
   Replay.Replay("stops");
   const auto& Stops = Replay.Process.Suspensions;
 
-  // Breakpoint at main, four steps (the last glued behind program output),
+  // Breakpoint at main, four steps (the last glued behind the program's
+  // "partial "),
   // the breakpoint in add, finish back to the call, one more step, two
   // watchpoints firing together in bump (one stop), the read watchpoint in
   // probe.
@@ -172,21 +172,6 @@ TEST(TranscriptEvents, TemplateBreakpointStopsInBothInstances) {
   ASSERT_EQ(Replay.Process.Suspensions.size(), 5u);
   EXPECT_TRUE(IsAt(Replay.Process.Suspensions[3].Location, "templates.cpp", 15));
   EXPECT_TRUE(IsAt(Replay.Process.Suspensions[4].Location, "templates.cpp", 28));
-}
-
-TEST(TranscriptEvents, ProgramOutputInterleavedWithRecordsIsLogged) {
-  TTranscriptReplay Replay;
-  Replay.Replay("stops");
-  const std::vector<std::string> Output = Replay.Process.Logged(etUnknown);
-
-  // "partial " had no line end; the stop record glued behind it is still a
-  // stop (checked in the stop order above), and only the text is logged.
-  EXPECT_THAT(Output, ::testing::Contains("partial "));
-  // "total=7" is glued to a "=breakpoint-modified" record, which is not one
-  // of the records split off program output: the whole line is logged.
-  EXPECT_THAT(Output, ::testing::Contains(StartsWith("total=7=breakpoint-modified,")));
-  EXPECT_THAT(Output, ::testing::Contains(" done\n"));
-  EXPECT_FALSE(Replay.Process.Called("Faulted"));
 }
 
 // ---------------------------------------------------------------------------
