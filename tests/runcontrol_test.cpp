@@ -1,4 +1,4 @@
-// Running, stopping, stepping, pausing, ending and detaching a program, and
+// Running, stopping, stepping, pausing and ending a program, and
 // the events the IDE hears meanwhile: against the real GDB through the
 // default "local" profile, and on the scripted fake debugger for what GDB
 // cannot be made to do.
@@ -13,10 +13,6 @@
 
 #include <algorithm>
 #include <filesystem>
-#include <fstream>
-#include <signal.h>
-#include <sys/wait.h>
-#include <unistd.h>
 
 namespace midebug {
 namespace {
@@ -43,16 +39,6 @@ public:
     CurrentNames.push_back(Process->GetModule(Module.Id).Name);
   }
 };
-
-/// The pid of the process tracing Pid, 0 when none.
-int TracerOf(int Pid) {
-  std::ifstream Status("/proc/" + std::to_string(Pid) + "/status");
-  std::string Line;
-  while (std::getline(Status, Line))
-    if (Line.rfind("TracerPid:", 0) == 0)
-      return std::atoi(Line.c_str() + 10);
-  return 0;
-}
 
 // Line numbers of tests/debuggees/stepping.c.
 constexpr Integer TwiceBodyLine = 2;
@@ -271,30 +257,6 @@ TEST_F(RunControl, SignalSetToNoStopPassNoLongerStops) {
   ASSERT_TRUE(Listener->PumpUntilCall("Exited("));
   EXPECT_FALSE(Listener->HasCall("Signal("));
   EXPECT_TRUE(Listener->HasCall("Exited(5,"));
-}
-
-TEST_F(RunControl, DetachLeavesTheAttachedProgramRunning) {
-  const std::string Program = Debuggee("busy");
-  const pid_t Busy = fork();
-  if (Busy == 0) {
-    if (chdir(Scratch.Path().c_str()) != 0)
-      _exit(126);
-    execl(Program.c_str(), Program.c_str(), static_cast<char*>(nullptr));
-    _exit(127);
-  }
-  Process = TGDBProcessManager::AttachProcess(Listener, Busy, "local", "Linux64", glC, gcAMD64);
-  ASSERT_TRUE(Process);
-  EXPECT_NE(TracerOf(Busy), 0);
-  Process->Detach();
-  ASSERT_TRUE(Listener->PumpUntilCall("Exited(0,"));
-  EXPECT_TRUE(ReleaseAndCheckDebuggerGone());
-  EXPECT_TRUE(ProcessRuns(Busy));
-  EXPECT_EQ(TracerOf(Busy), 0);
-  // Still running, not stopped: it takes a signal and ends by it.
-  kill(Busy, SIGTERM);
-  int Status = 0;
-  EXPECT_EQ(waitpid(Busy, &Status, 0), Busy);
-  EXPECT_TRUE(WIFSIGNALED(Status) && WTERMSIG(Status) == SIGTERM);
 }
 
 TEST_F(RunControl, LoadedAndUnloadedModulesReachTheListenerAndSetTheBaseAddress) {
