@@ -262,25 +262,6 @@ TEST(ParserStops, SignalReceivedFromLLDBNamesTheNumber) {
   }
 }
 
-TEST(ParserStops, ExceptionReportedAsText) {
-  TRecordingProcess Process;
-  Parse(R"(*stopped,reason="exception-received",exception="Exception throw 'EMyError' object 0x1234 encountered at address 0x5678",thread-id="1")"
-        "\n",
-        Process);
-  ASSERT_EQ(Process.Exceptions.size(), 1u);
-  const TGDBException& Thrown = Process.Exceptions[0];
-  EXPECT_EQ(Thrown.Name, "EMyError");
-  EXPECT_EQ(Thrown.EObject, 0x1234u);
-  EXPECT_EQ(Thrown.Kind, 16);
-  EXPECT_EQ(Thrown.Location.Address, 0x5678u);
-
-  Parse(R"(*stopped,reason="exception-received",exception="Exception catch at 0x1",thread-id="1")"
-        "\n",
-        Process);
-  ASSERT_EQ(Process.Exceptions.size(), 2u);
-  EXPECT_EQ(Process.Exceptions[1].Kind, 1);
-}
-
 TEST(ParserStops, LocationFromOriginalLocation) {
   struct TCase {
     std::string Frame;
@@ -353,19 +334,6 @@ TEST(ParserStreams, ConsoleAndTargetText) {
   };
   for (const TCase& Case : Cases)
     EXPECT_EQ(Parse(Case.Block + "\n"), Case.Calls) << Case.Block;
-}
-
-TEST(ParserStreams, ConsoleRecordsByPlatform) {
-  TRecordingProcess Windows;
-  Windows.Windows = true;
-  EXPECT_EQ(Parse("~\"ODS: hello\\n\"\n", Windows), TCalls{"Log(3,hello\\n)"});
-  TRecordingProcess LLDB;
-  LLDB.LLDB = true;
-  EXPECT_EQ(Parse("~\"target.max-children-count (int) = 256\\n\"\n"
-                  "~\"NAME         PASS   STOP   NOTIFY\\n===========  =====  =====  ======\\nSIGHUP\"\n"
-                  "some program output\nProcess ready to launch\n",
-                  LLDB),
-            (TCalls{"MaxChildren(256)", "Started"}));
 }
 
 TEST(ParserStreams, ProgramOutputKeepsItsDigitsAndPromptsVanish) {

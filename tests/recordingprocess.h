@@ -26,7 +26,6 @@ class TRecordingProcess : public IGDBInternalProcess {
 public:
   // What the process answers.
   bool LLDB = false;
-  bool Windows = false;
   bool HXConsole = false;
   bool Dying = false;
   bool BreakpointHandled = false;
@@ -38,7 +37,6 @@ public:
   std::vector<TStop> Suspensions;
   std::vector<std::pair<Integer, TStop>> BreakpointHits;
   std::vector<std::pair<TGDBException, Integer>> Signals;
-  std::vector<TGDBException> Exceptions;
   std::vector<std::pair<Integer, std::string>> Exits;
   std::vector<TGDBModule> Modules;
 
@@ -76,7 +74,6 @@ public:
     Record("Signal", Signal.Name + "," + Signal.Desc + "," + Describe(Signal.Location) + "," + std::to_string(ThreadId));
   }
   void NotifyExceptionRaised(const TGDBException& Exception, Integer ThreadId) override {
-    Exceptions.push_back(Exception);
     Record("Exception", Exception.Name + "," + std::to_string(ThreadId));
   }
   void NotifyThreadCreated(Integer ThreadId, Integer OsId) override {
@@ -116,8 +113,8 @@ public:
   std::string GetEndOfLineMarker() override { return EndOfLineMarker; }
   bool IsLLDB() override { return LLDB; }
   bool IsAndroid64() override { return false; }
-  bool IsLinux() override { return !Windows; }
-  bool IsWindows() override { return Windows; }
+  bool IsLinux() override { return true; }
+  bool IsWindows() override { return false; }
   bool IsAttachMode() override { return false; }
   bool SupportHXConsole() override { return HXConsole; }
   bool IsDying() override { return Dying; }
