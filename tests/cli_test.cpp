@@ -104,14 +104,6 @@ std::string FileName(const json& Object) {
 
 // --- Errors -------------------------------------------------------------------
 
-TEST_F(CliTest, CliStartOfAMissingProgramIsAnErrorAndFails) {
-  const TCliRun Run = RunCli(Quote(Scratch.Path() + "/no-such-program"), "run\n");
-  EXPECT_NE(Run.ExitCode, 0);
-  ASSERT_EQ(Run.Lines.size(), 1u) << Run.Stdout;
-  EXPECT_EQ(Run.Lines[0]["answer"], "start");
-  EXPECT_NE(Run.Lines[0]["error"].get<std::string>().find("No such file"), std::string::npos) << Run.Stdout;
-}
-
 TEST_F(CliTest, CliCommandsThatCannotRunSayWhyAndTheSessionGoesOn) {
   const std::string Program = Debuggee("exitthree");
   const TCliRun Run = RunCli(Quote(Program), "frobnicate now\nnext\nbt\nthread x\n");
