@@ -240,23 +240,5 @@ TEST(TranscriptDecoders, VariableObjectsOfClassAndPascalRecord) {
   EXPECT_EQ(Element.FValue, "20");
 }
 
-TEST(TranscriptDecoders, RegisterNamesMapToGdbNumbers) {
-  TTranscriptReplay Replay;
-  auto& Names = Replay.Expect<TDataListRegisterNamesResult>("0520000000004", gcAMD64, "Linux64");
-  Replay.Replay("registers");
-
-  EXPECT_TRUE(IsEntered(Names));
-  const TIntegerArray Ids = Names.GetRegisterIds();
-  ASSERT_EQ(Ids.size(), 24u);
-  EXPECT_EQ(Ids[14], 6) << "rbp";
-  EXPECT_EQ(Ids[17], 17) << "our rflags is GDB's eflags";
-  const TIntegerArray FPUIds = Names.GetFPURegisterIds();
-  ASSERT_EQ(FPUIds.size(), 16u);
-  EXPECT_EQ(FPUIds[15], 39) << "fop";
-  const TIntegerArray XMMIds = Names.GetXMMRegisterIds();
-  ASSERT_EQ(XMMIds.size(), 17u);
-  EXPECT_EQ(XMMIds[16], 56) << "mxcsr";
-}
-
 } // namespace
 } // namespace midebug::test
