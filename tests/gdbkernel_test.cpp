@@ -111,16 +111,6 @@ TEST_F(FakeDebuggerTest, RepliesOfAndBeyondTheBufferSizeArriveWhole) {
   }
 }
 
-TEST_F(FakeDebuggerTest, MarkerInASecondReadEndsTheReply) {
-  auto Kernel = StartFake(ReadWholeFile(test::TestDataDir() + "/fakemi/split-marker.script"));
-  std::string Reply;
-  ASSERT_TRUE(Kernel->GetReply(Reply));
-  EXPECT_EQ(Reply, "");
-  ASSERT_TRUE(Kernel->SendRequest("0980000000003-gdb-version"));
-  ASSERT_TRUE(Kernel->GetReply(Reply));
-  EXPECT_EQ(Reply, "0980000000003^done\n");
-}
-
 TEST_F(FakeDebuggerTest, PromptInsideOneReadEndsABlockAndTheRestStartsTheNext) {
   // GDB prints the next library record right after the prompt that follows
   // "*running"; nothing more may come while the program runs, so the block
