@@ -291,22 +291,6 @@ TEST_F(RunControl, LoadedAndUnloadedModulesReachTheListenerAndSetTheBaseAddress)
     EXPECT_EQ(Modules->CurrentNames[Index], Modules->Loaded[Index].Name);
 }
 
-TEST_F(RunControl, LaunchThatCannotExecTheProgramEndsWithTheDebuggersReason) {
-  // GDB names the shell's process id before the exec fails, so the launch
-  // ends as an exit with the reason rather than as a missing process id.
-  const std::string Program = Scratch.Path() + "/stepping";
-  std::filesystem::copy_file(Debuggee("stepping"), Program);
-  std::filesystem::permissions(Program, std::filesystem::perms::owner_exec | std::filesystem::perms::group_exec |
-                                            std::filesystem::perms::others_exec,
-                               std::filesystem::perm_options::remove);
-  Launch(Program);
-  Process->Run();
-  ASSERT_TRUE(Listener->PumpUntilCall("Exited("));
-  EXPECT_TRUE(Listener->HasCallContaining("During startup program exited with code 126."));
-  EXPECT_FALSE(ProcessOf(Process).Alive());
-  EXPECT_TRUE(ReleaseAndCheckDebuggerGone());
-}
-
 // --- The scripted fake debugger -------------------------------------------------
 
 class RunControlFake : public ::testing::Test {
