@@ -58,16 +58,6 @@ TEST(ParserScanner, CStringUnescapesOnlyQuotes) {
   }
 }
 
-TEST(ParserScanner, FindValueConsumesOnlyTheFirstResult) {
-  TMIScanner Scanner(R"(x="1",y="2")");
-  EXPECT_EQ(Scanner.FindValue("y"), "2");
-  EXPECT_EQ(Scanner.Pos(), 0u) << "a later result is found without moving";
-  EXPECT_EQ(Scanner.FindValue("x"), "1");
-  EXPECT_EQ(Scanner.Rest(), R"(y="2")") << "the first result is consumed";
-  EXPECT_EQ(Scanner.FindValue("missing"), "");
-  EXPECT_EQ(Scanner.Rest(), R"(y="2")");
-}
-
 TEST(ParserScanner, ValuesOfEveryShape) {
   const std::pair<std::string, std::string> Cases[] = {
       {R"(v={a="1",b=[{c="2"}]})", R"(a="1",b=[{c="2"}])"},
@@ -98,14 +88,6 @@ TEST(ParserScanner, NumbersFollowTheProtocolsConverter) {
   EXPECT_EQ(MIStrToUInt64Def("0xffffffffffffffff", 0), ~UInt64{0});
   EXPECT_EQ(MIStrToUInt64Def("0x1ffffffffffffffff", 7), 7u);
   EXPECT_EQ(MIStrToUInt64Def("<MULTIPLE>", 0), 0u);
-}
-
-// --- Garbage never crashes or hangs ------------------------------------------
-
-TEST(ParserGarbage, NulByteDoesNotEndTheBlock) {
-  const TCalls Calls = Parse(std::string("abc\0def\n=thread-exited,id=\"2\"\n", 30));
-  ASSERT_EQ(Calls.size(), 2u);
-  EXPECT_EQ(Calls[1], "ThreadExited(2)");
 }
 
 // --- Result records ------------------------------------------------------------
@@ -300,19 +282,6 @@ TEST(ParserNotify, ThreadAndGroupRecords) {
   };
   for (const TCase& Case : Cases)
     EXPECT_EQ(Parse(Case.Record + "\n"), Case.Calls) << Case.Record;
-}
-
-TEST(ParserNotify, LLDBLibraryWithoutLoadAddressIsNotReported) {
-  TRecordingProcess Process;
-  Process.LLDB = true;
-  EXPECT_EQ(Parse(R"(=library-loaded,id="1",target-name="C:\\w\\a.dll",host-name="a",loaded_addr="0x0")"
-                  "\n",
-                  Process),
-            TCalls{});
-  EXPECT_EQ(Parse(R"(=breakpoint-modified,bkpt={number="2",addr="0x10",file="a.c",line="3"})"
-                  "\n",
-                  Process),
-            TCalls{"BreakpointModified(2,a.c:3@0x10)"});
 }
 
 // --- Streams and program output ----------------------------------------------------
