@@ -250,15 +250,6 @@ TEST_F(RunControl, SignalTheIdeKeepsIsAStopThatResumes) {
   EXPECT_TRUE(Listener->HasCall("Exited(5,"));
 }
 
-TEST_F(RunControl, SignalSetToNoStopPassNoLongerStops) {
-  Launch(Debuggee("usr1"));
-  Process->SetOsException("SIGUSR1", false, true);
-  Process->Run();
-  ASSERT_TRUE(Listener->PumpUntilCall("Exited("));
-  EXPECT_FALSE(Listener->HasCall("Signal("));
-  EXPECT_TRUE(Listener->HasCall("Exited(5,"));
-}
-
 TEST_F(RunControl, LoadedAndUnloadedModulesReachTheListenerAndSetTheBaseAddress) {
   TIntfPtr<TModuleListener> Modules(new TModuleListener);
   Listener = Modules;
