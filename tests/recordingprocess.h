@@ -36,7 +36,6 @@ public:
   std::vector<std::string> Calls;
   std::vector<TStop> Suspensions;
   std::vector<std::pair<Integer, TStop>> BreakpointHits;
-  std::vector<std::pair<TGDBException, Integer>> Signals;
   std::vector<std::pair<Integer, std::string>> Exits;
   std::vector<TGDBModule> Modules;
 
@@ -70,7 +69,6 @@ public:
     Record("Suspended", Describe(Location) + "," + std::to_string(ThreadId) + "," + std::to_string(static_cast<int>(Reason)));
   }
   void NotifySignalReceived(const TGDBException& Signal, Integer ThreadId) override {
-    Signals.emplace_back(Signal, ThreadId);
     Record("Signal", Signal.Name + "," + Signal.Desc + "," + Describe(Signal.Location) + "," + std::to_string(ThreadId));
   }
   void NotifyExceptionRaised(const TGDBException& Exception, Integer ThreadId) override {

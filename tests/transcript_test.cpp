@@ -132,26 +132,6 @@ TEST(TranscriptEvents, ExitCodesReadAsGdbMeansThem) {
   }
 }
 
-TEST(TranscriptEvents, SignalsReportNameMeaningLocationAndThread) {
-  TTranscriptReplay Replay;
-  Replay.Replay("signals");
-  const auto& Signals = Replay.Process.Signals;
-
-  ASSERT_EQ(Signals.size(), 2u);
-  EXPECT_EQ(Signals[0].first.Name, "SIGUSR1");
-  EXPECT_EQ(Signals[0].first.Desc, "User defined signal 1");
-  EXPECT_TRUE(IsAt(Signals[0].first.Location, "pthread_kill.c", 44));
-  EXPECT_EQ(Signals[0].second, 1);
-  EXPECT_EQ(Signals[1].first.Name, "SIGSEGV");
-  EXPECT_EQ(Signals[1].first.Desc, "Segmentation fault");
-  EXPECT_TRUE(IsAt(Signals[1].first.Location, "signals.c", 14));
-  EXPECT_EQ(Signals[1].first.Location.Address, 0x00005555555551bfu);
-  EXPECT_EQ(Signals[1].second, 1);
-  // A signal is not a suspension of its own, and the fatal one ends the run.
-  EXPECT_TRUE(Replay.Process.Suspensions.empty());
-  EXPECT_THAT(Replay.Process.Exits, ElementsAre(std::make_pair(0, std::string("SIGSEGV"))));
-}
-
 TEST(TranscriptEvents, TemplateBreakpointStopsInBothInstances) {
   TTranscriptReplay Replay;
   Replay.Replay("templates");
