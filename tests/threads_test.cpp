@@ -189,15 +189,6 @@ TEST_F(ThreadsInC, AnotherThreadsFrameIsWhereTheDebuggerActsUntilTheThreadIsSele
   EXPECT_TRUE(IsCHeader(Worker->GetCallHeader(1), "inner(x=3)"));
 }
 
-TEST_F(ThreadsInC, UnknownThreadNumbersGiveTheZombieWhichHasNoStack) {
-  const TIntfPtr<IGDBThread> Unknown = Process->GetThread(99);
-  EXPECT_EQ(Unknown->GetState(), tsZombie);
-  EXPECT_EQ(Unknown->GetCallCount(), 0);
-  EXPECT_EQ(Unknown->GetCallHeader(1), "");
-  EXPECT_EQ(Process->GetSuspendedThreadId(), 2) << "asking the zombie does not move the debugger";
-  EXPECT_TRUE(IsCHeader(Worker->GetCallHeader(1), "inner(x=3)"));
-}
-
 TEST_F(ThreadsInC, SteppingAThreadStepsThatThreadEvenWhenAnotherIsCurrent) {
   Of(MainThread).SetAsSuspendedThread();
   ASSERT_EQ(Process->GetSuspendedThreadId(), 1);
