@@ -93,15 +93,6 @@ TEST(KernelWithGdb, LogsTheTrafficIntoANewNestedDirectory) {
   EXPECT_NE(Log.find("42^done\n(gdb) \n"), std::string::npos);
 }
 
-TEST(KernelStartFailure, MissingProgramIsNamed) {
-  TGDBKernel Kernel("/no/such/dir/gdb", "");
-  EXPECT_FALSE(Kernel.Start());
-  EXPECT_EQ(Kernel.GetLastError(false), "Could not find program, '/no/such/dir/gdb'");
-  std::string Reply;
-  EXPECT_FALSE(Kernel.GetReply(Reply));
-  EXPECT_EQ(Kernel.GetLastError(true), "process exited");
-}
-
 TEST_F(FakeDebuggerTest, RepliesOfAndBeyondTheBufferSizeArriveWhole) {
   for (const size_t Size : {2048u, 100000u}) {
     auto Kernel = StartFake("sendfill " + std::to_string(Size) + " x\nsleep 20\nprompt\nwait-eof\n");
