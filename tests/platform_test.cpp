@@ -58,16 +58,6 @@ TEST(PlatformText, IsValidUTF8StopsAtTheEndOfAViewCutInsideASequence) {
   }
 }
 
-TEST(PlatformText, AnsiToUTF8ReadsWindows1252) {
-  const std::pair<std::string, std::string> Cases[] = {
-      {"\x81", "\xC2\x81"},                                 // undefined: the C1 control U+0081
-      {"\x9F", "\xC5\xB8"},                                 // Y with diaeresis U+0178
-      {"caf\xE9 \x80\x35", "caf\xC3\xA9 \xE2\x82\xAC\x35"}, // mixed
-  };
-  for (const auto& [Ansi, Expected] : Cases)
-    EXPECT_EQ(AnsiToUTF8(Ansi), Expected) << "input " << ::testing::PrintToString(Ansi);
-}
-
 // --- Command lines ---------------------------------------------------------
 
 TEST(PlatformCommandLine, SplitCommandLineHonoursBlanksQuotesAndEscapes) {
