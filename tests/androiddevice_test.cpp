@@ -96,7 +96,7 @@ bool AllKillsAre(const TStringArray& Kills, const std::string& Id) {
   return !Kills.empty() && std::all_of(Kills.begin(), Kills.end(), [&](const std::string& Kill) { return Kill == Id; });
 }
 
-TEST(AndroidDeviceServerId, FoundInTheProcessList) {
+TEST(AndroidDevice, StartFindsTheServerIdAndDestructionKillsItAndAwaitsItsRun) {
   const struct {
     const char* Name;
     TStringArray Listings;
@@ -128,26 +128,14 @@ TEST(AndroidDeviceServerId, FoundInTheProcessList) {
     // Whatever id was found, its kill ends the server, so that a wrong id
     // fails here instead of keeping the device from ever shutting down.
     Bridge.SetServerDeviceId(Device->FLLDBServerPid);
+    EXPECT_FALSE(Bridge.KillsRecorded());
+    const int ServerPid = Bridge.ServerHostPid();
     Device.reset();
     EXPECT_TRUE(AllKillsAre(Bridge.Kills(), std::to_string(Case.Id))) << ::testing::PrintToString(Bridge.Kills());
+    // The device awaited the server's run: its process has been collected.
+    EXPECT_EQ(kill(ServerPid, 0), -1);
+    EXPECT_EQ(errno, ESRCH);
   }
-}
-
-TEST(AndroidDeviceLifetime, DestroyingTheDeviceKillsTheServerAndAwaitsItsRun) {
-  const TFakeBridge Bridge;
-  Bridge.SetListings({PsLine("shell", "1234", "lldb-server")});
-  Bridge.SetServerDeviceId(1234);
-  auto Device = Bridge.MakeDevice();
-  ASSERT_TRUE(Device->StartLLDBServer()) << Device->FLastError;
-  const int ServerPid = Bridge.ServerHostPid();
-  ASSERT_GT(ServerPid, 0);
-  EXPECT_FALSE(Bridge.KillsRecorded());
-
-  Device.reset();
-  EXPECT_TRUE(AllKillsAre(Bridge.Kills(), "1234")) << ::testing::PrintToString(Bridge.Kills());
-  // The run has ended and its process has been collected.
-  EXPECT_EQ(kill(ServerPid, 0), -1);
-  EXPECT_EQ(errno, ESRCH);
 }
 
 } // namespace
