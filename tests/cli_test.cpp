@@ -7,7 +7,6 @@
 #include <gtest/gtest.h>
 #include <nlohmann/json.hpp>
 
-#include <algorithm>
 #include <cstdlib>
 #include <filesystem>
 #include <fstream>
@@ -48,20 +47,6 @@ struct TCliRun {
   }
   const json* Answer(const std::string& Name) const {
     return Find([&](const json& Line) { return Line.value("answer", "") == Name; });
-  }
-  /// The events and answers in order, as "event:NAME" and "answer:NAME",
-  /// without the debugger's console chatter and modules.
-  std::vector<std::string> Sequence() const {
-    std::vector<std::string> Names;
-    for (const json& Line : Lines) {
-      if (Line.contains("answer"))
-        Names.push_back("answer:" + Line["answer"].get<std::string>());
-      else if (Line.contains("event") && Line["event"] != "output" && Line["event"] != "module-loaded" &&
-               Line["event"] != "module-unloaded" && Line["event"] != "running" &&
-               Line["event"] != "thread-created" && Line["event"] != "thread-exited")
-        Names.push_back("event:" + Line["event"].get<std::string>());
-    }
-    return Names;
   }
 };
 
@@ -117,38 +102,7 @@ std::string FileName(const json& Object) {
   return std::filesystem::path(Object.value("file", std::string())).filename().string();
 }
 
-// --- Start-up and the session's own commands ----------------------------------
-
-TEST_F(CliTest, CliStartLoadsTheProgramAndNamesItsLanguageAndCpu) {
-  const std::string Program = Debuggee("exitthree");
-  const TCliRun Run = RunCli(Quote(Program), "quit\n");
-  EXPECT_EQ(Run.ExitCode, 0) << Run.Stderr;
-  const json* Loaded = Run.Event("loaded");
-  ASSERT_NE(Loaded, nullptr) << Run.Stdout;
-  EXPECT_EQ((*Loaded)["program"], Program);
-  EXPECT_EQ((*Loaded)["language"], "c");
-  EXPECT_EQ((*Loaded)["cpu"], "amd64");
-  EXPECT_NE(Run.Answer("quit"), nullptr);
-}
-
-TEST_F(CliTest, CliStartGuessesCxxFromTheSourceBesideTheProgram) {
-  // A copy of a C++ program with an empty file of its name and ".cpp" beside.
-  const std::string Program = Scratch.Path() + "/plus";
-  std::filesystem::copy_file(Debuggee("exitthree"), Program);
-  Scratch.WriteFile("plus.cpp", "");
-  const TCliRun Run = RunCli(Quote(Program), "");
-  const json* Loaded = Run.Event("loaded");
-  ASSERT_NE(Loaded, nullptr) << Run.Stdout;
-  EXPECT_EQ((*Loaded)["language"], "c++");
-}
-
-TEST_F(CliTest, CliStartOfAMissingProgramIsAnErrorAndFails) {
-  const TCliRun Run = RunCli(Quote(Scratch.Path() + "/no-such-program"), "run\n");
-  EXPECT_NE(Run.ExitCode, 0);
-  ASSERT_EQ(Run.Lines.size(), 1u) << Run.Stdout;
-  EXPECT_EQ(Run.Lines[0]["answer"], "start");
-  EXPECT_NE(Run.Lines[0]["error"].get<std::string>().find("No such file"), std::string::npos) << Run.Stdout;
-}
+// --- Errors -------------------------------------------------------------------
 
 TEST_F(CliTest, CliCommandsThatCannotRunSayWhyAndTheSessionGoesOn) {
   const std::string Program = Debuggee("exitthree");
@@ -167,62 +121,7 @@ TEST_F(CliTest, CliCommandsThatCannotRunSayWhyAndTheSessionGoesOn) {
   EXPECT_EQ((*Thread)["error"], "usage: thread N");
 }
 
-// --- Running to the exit ---------------------------------------------------------
-
-TEST_F(CliTest, CliRunReachesTheExitWithTheProgramsCodeAndOutput) {
-  const std::string Program = Debuggee("exitthree");
-  const TCliRun Run = RunCli(Quote(Program), "run\ncontinue\n");
-  EXPECT_EQ(Run.ExitCode, 0);
-  const json* Exited = Run.Event("exited");
-  ASSERT_NE(Exited, nullptr) << Run.Stdout << Run.Stderr;
-  EXPECT_EQ((*Exited)["code"], 3);
-  const json* RunAnswer = Run.Answer("run");
-  ASSERT_NE(RunAnswer, nullptr);
-  EXPECT_EQ((*RunAnswer)["state"], "exited");
-  EXPECT_NE(Run.Find([](const json& Line) {
-    return Line.value("event", "") == "output" && Line.value("text", "").find("marker-7781") != std::string::npos;
-  }),
-            nullptr)
-      << Run.Stdout;
-  // After the exit, the session says so instead of resuming.
-  const json* Continue = Run.Answer("continue");
-  ASSERT_NE(Continue, nullptr);
-  EXPECT_EQ((*Continue)["error"], "the program has exited");
-}
-
-TEST_F(CliTest, CliLogKeepsTheMiTrafficInTheNamedFile) {
-  const std::string Program = Debuggee("exitthree");
-  const std::string Log = Scratch.Path() + "/logs/session.log";
-  const TCliRun Run = RunCli("--log " + Quote(Log) + " " + Quote(Program), "quit\n");
-  EXPECT_EQ(Run.ExitCode, 0) << Run.Stderr;
-  const std::string Traffic = ReadAll(Log);
-  EXPECT_NE(Traffic.find("-file-exec-and-symbols"), std::string::npos) << Traffic;
-  // Only the named file remains: the debugger's own log was renamed.
-  size_t Files = 0;
-  for ([[maybe_unused]] const auto& Entry : std::filesystem::directory_iterator(Scratch.Path() + "/logs"))
-    ++Files;
-  EXPECT_EQ(Files, 1u);
-}
-
-TEST_F(CliTest, CliRunPauseInterruptsAProgramThatNeverStopsAndKillEndsIt) {
-  const std::string Program = Debuggee("busy");
-  // The program never stops by itself, so the run's short wait always ends
-  // unanswered; the later --wait wins over the default.
-  // The wait also bounds the pause, whose stop takes several requests: leave
-  // room for a loaded machine.
-  const TCliRun Run = RunCli("--wait 6 " + Quote(Program), "run\npause\nkill\n");
-  const json* RunAnswer = Run.Answer("run");
-  ASSERT_NE(RunAnswer, nullptr) << Run.Stdout;
-  EXPECT_NE((*RunAnswer)["error"].get<std::string>().find("did not stop"), std::string::npos);
-  const json* Stopped = Run.Event("stopped");
-  ASSERT_NE(Stopped, nullptr) << Run.Stdout;
-  // An interruption is a step stop, not a signal.
-  EXPECT_EQ((*Stopped)["reason"], "step");
-  EXPECT_EQ(FileName(*Stopped), "busy.c");
-  const std::vector<std::string> Expected = {"event:loaded", "answer:run",  "event:stopped", "answer:pause",
-                                             "event:exited", "answer:kill"};
-  EXPECT_EQ(Run.Sequence(), Expected) << Run.Stdout;
-}
+// --- Attaching -----------------------------------------------------------------
 
 TEST_F(CliTest, CliAttachShowsTheStackAndDetachLeavesTheProgramRunning) {
   const std::string Program = Debuggee("sleeper");
@@ -257,6 +156,11 @@ TEST_F(CliTest, CliAttachShowsTheStackAndDetachLeavesTheProgramRunning) {
 TEST_F(CliTest, CliSteppingNextStepAndFinishFollowTheSource) {
   const std::string Program = Debuggee("loop");
   const TCliRun Run = RunCli(Quote(Program), "start\nnext\nnext\nstep\nbt\nfinish\ncontinue\n");
+  EXPECT_EQ(Run.ExitCode, 0) << Run.Stderr;
+  const json* Loaded = Run.Event("loaded");
+  ASSERT_NE(Loaded, nullptr) << Run.Stdout;
+  EXPECT_EQ((*Loaded)["program"], Program);
+  EXPECT_EQ((*Loaded)["language"], "c");
   std::vector<const json*> Stops;
   for (const json& Line : Run.Lines)
     if (Line.value("event", "") == "stopped")
@@ -287,37 +191,6 @@ TEST_F(CliTest, CliSteppingNextStepAndFinishFollowTheSource) {
   const json* Exited = Run.Event("exited");
   ASSERT_NE(Exited, nullptr);
   EXPECT_EQ((*Exited)["code"], 4);
-}
-
-TEST_F(CliTest, CliSteppingThreadsAndFrameDescribeTheStoppedProgram) {
-  const std::string Program = Debuggee("loop");
-  const TCliRun Run = RunCli(Quote(Program), "start\nnext\nnext\nstep\nthreads\nframe 1\nthread 1\nframe 9\nkill\n");
-  const json* Threads = Run.Answer("threads");
-  ASSERT_NE(Threads, nullptr) << Run.Stdout;
-  ASSERT_FALSE(Threads->contains("error")) << *Threads;
-  ASSERT_EQ((*Threads)["threads"].size(), 1u) << *Threads;
-  EXPECT_EQ((*Threads)["threads"][0]["id"], 1);
-  EXPECT_EQ((*Threads)["threads"][0]["state"], "stopped");
-  EXPECT_EQ((*Threads)["threads"][0]["current"], true);
-
-  const json* Frame = Run.Answer("frame");
-  ASSERT_NE(Frame, nullptr);
-  ASSERT_FALSE(Frame->contains("error")) << *Frame;
-  EXPECT_EQ((*Frame)["level"], 1);
-  EXPECT_EQ((*Frame)["line"], LineOf("main-call"));
-
-  const json* Thread = Run.Answer("thread");
-  ASSERT_NE(Thread, nullptr);
-  EXPECT_EQ((*Thread)["thread"], 1);
-  EXPECT_EQ((*Thread)["line"], LineOf("square-body"));
-
-  const json* NoFrame = Run.Find([](const json& Line) { return Line.value("answer", "") == "frame" && Line.contains("error"); });
-  ASSERT_NE(NoFrame, nullptr);
-  EXPECT_EQ((*NoFrame)["error"], "no frame 9");
-
-  const json* Kill = Run.Answer("kill");
-  ASSERT_NE(Kill, nullptr);
-  EXPECT_EQ((*Kill)["state"], "exited") << *Kill;
 }
 
 } // namespace

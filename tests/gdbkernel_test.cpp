@@ -3,15 +3,12 @@
 #include "kernel/gdbkernel.h"
 #include "kernel/lldbkernel.h"
 #include "midebug.h"
-#include "platform/hostfiles.h"
 #include "platform/hostthread.h"
 #include "testsupport.h"
 
 #include <gtest/gtest.h>
 
 #include <filesystem>
-#include <fstream>
-#include <sstream>
 
 namespace midebug {
 namespace {
@@ -26,10 +23,10 @@ using test::TScratchDir;
 class FakeDebuggerTest : public ::testing::Test {
 protected:
   template <class TKernel = TGDBKernel>
-  std::unique_ptr<TKernel> StartFake(const std::string& Script, const std::string& Launcher = {}) {
+  std::unique_ptr<TKernel> StartFake(const std::string& Script) {
     ScriptEnv.reset();
     ScriptEnv = std::make_unique<TScopedEnv>("FAKEMI_SCRIPT", Scratch.WriteFile("fake.script", Script));
-    auto Kernel = std::make_unique<TKernel>(Launcher.empty() ? FakeDebuggerPath() : Launcher, "");
+    auto Kernel = std::make_unique<TKernel>(FakeDebuggerPath(), "");
     EXPECT_TRUE(Kernel->Start()) << Kernel->GetLastError(false);
     return Kernel;
   }
@@ -96,15 +93,6 @@ TEST(KernelWithGdb, LogsTheTrafficIntoANewNestedDirectory) {
   EXPECT_NE(Log.find("42^done\n(gdb) \n"), std::string::npos);
 }
 
-TEST(KernelStartFailure, MissingProgramIsNamed) {
-  TGDBKernel Kernel("/no/such/dir/gdb", "");
-  EXPECT_FALSE(Kernel.Start());
-  EXPECT_EQ(Kernel.GetLastError(false), "Could not find program, '/no/such/dir/gdb'");
-  std::string Reply;
-  EXPECT_FALSE(Kernel.GetReply(Reply));
-  EXPECT_EQ(Kernel.GetLastError(true), "process exited");
-}
-
 TEST_F(FakeDebuggerTest, RepliesOfAndBeyondTheBufferSizeArriveWhole) {
   for (const size_t Size : {2048u, 100000u}) {
     auto Kernel = StartFake("sendfill " + std::to_string(Size) + " x\nsleep 20\nprompt\nwait-eof\n");
@@ -112,16 +100,6 @@ TEST_F(FakeDebuggerTest, RepliesOfAndBeyondTheBufferSizeArriveWhole) {
     ASSERT_TRUE(Kernel->GetReply(Reply));
     EXPECT_EQ(Reply, std::string(Size, 'x'));
   }
-}
-
-TEST_F(FakeDebuggerTest, MarkerInASecondReadEndsTheReply) {
-  auto Kernel = StartFake(ReadWholeFile(test::TestDataDir() + "/fakemi/split-marker.script"));
-  std::string Reply;
-  ASSERT_TRUE(Kernel->GetReply(Reply));
-  EXPECT_EQ(Reply, "");
-  ASSERT_TRUE(Kernel->SendRequest("0980000000003-gdb-version"));
-  ASSERT_TRUE(Kernel->GetReply(Reply));
-  EXPECT_EQ(Reply, "0980000000003^done\n");
 }
 
 TEST_F(FakeDebuggerTest, PromptInsideOneReadEndsABlockAndTheRestStartsTheNext) {
@@ -187,75 +165,11 @@ TEST_F(FakeDebuggerTest, CommandFileIsPassedAndTheDebuggerRunsBesideIt) {
   EXPECT_FALSE(std::filesystem::exists(CommandFile));
 }
 
-TEST_F(FakeDebuggerTest, DebuggerWithoutCommandFileRunsInItsOwnDirectory) {
-  auto Kernel = StartFake("print-cwd\nprompt\nwait-eof\n");
-  std::string Reply;
-  ASSERT_TRUE(Kernel->GetReply(Reply));
-  EXPECT_EQ(Reply, ExtractFileDir(FakeDebuggerPath()) + "\n");
-}
-
-TEST(KernelEndOfLineMarker, FollowsLineEndsAndDebuggerKind) {
-  TGDBKernel Gdb("", "");
-  TLLDBKernel Lldb("", "");
-  EXPECT_EQ(Gdb.GetEndOfLineMarker(), "(gdb) \n");
-  EXPECT_EQ(Lldb.GetEndOfLineMarker(), "(gdb)\n");
-  Gdb.SetCapabilites(Gdb.GetCapabilities() | capCRLFLineEnds);
-  Lldb.SetCapabilites(Lldb.GetCapabilities() | capCRLFLineEnds);
-  EXPECT_EQ(Gdb.GetEndOfLineMarker(), "(gdb) \r\n");
-  EXPECT_EQ(Lldb.GetEndOfLineMarker(), "(gdb)\r\n");
-  EXPECT_EQ(Lldb.GetCommandFileOption(), "--source");
-}
-
 TEST_F(FakeDebuggerTest, LldbPromptEndsAReplyWithoutTheBlank) {
   auto Kernel = StartFake<TLLDBKernel>("send ^done\nsendraw (gdb)\\n\nwait-eof\n");
   std::string Reply;
   ASSERT_TRUE(Kernel->GetReply(Reply));
   EXPECT_EQ(Reply, "^done\n");
-}
-
-TEST_F(FakeDebuggerTest, LldbHandsOverAnUnfinishedReplyAfterFiveQuietSeconds) {
-  auto Kernel = StartFake<TLLDBKernel>("send ^done\nsendraw (gdb) \\n\nwait-eof\n");
-  std::string Reply;
-  ASSERT_TRUE(Kernel->GetReply(Reply));
-  EXPECT_EQ(Reply, "^done\n(gdb) \n");
-}
-
-/// A copy of the fake debugger under another file name.
-std::string InstallFakeAs(const TScratchDir& Dir, const std::string& Name) {
-  const std::string Path = Dir.Path() + "/" + Name;
-  std::filesystem::copy_file(FakeDebuggerPath(), Path);
-  return Path;
-}
-
-TEST_F(FakeDebuggerTest, LldbFrontEndForAWindowsTargetIsRecognisedByItsExactName) {
-  const std::string Script = "prompt\nwait-eof\n";
-  auto FrontEnd = std::make_unique<TLLDBKernel>(InstallFakeAs(Scratch, "lldb-mi"), "");
-  FrontEnd->FKernelType = ktLLDB | 4 | ktWindowsTarget;
-  ScriptEnv = std::make_unique<TScopedEnv>("FAKEMI_SCRIPT", Scratch.WriteFile("fake.script", Script));
-  ASSERT_TRUE(FrontEnd->Start());
-  EXPECT_TRUE(FrontEnd->IsWindows());
-  EXPECT_TRUE(FrontEnd->SupportStopOnEntryPoint());
-
-  auto OtherCase = std::make_unique<TLLDBKernel>(InstallFakeAs(Scratch, "LLDB-MI"), "");
-  OtherCase->FKernelType = ktLLDB | 4 | ktWindowsTarget;
-  ASSERT_TRUE(OtherCase->Start());
-  EXPECT_FALSE(OtherCase->IsWindows());
-}
-
-TEST(KernelLLDBInitFile, OnlyForWindowsOrAndroidAndOnlyWhenItExists) {
-  TScratchDir Root;
-  SetHostRootDirectory(Root.Path());
-  TGDBKernel Kernel("", "");
-  EXPECT_EQ(Kernel.GetLLDBInitFile(), "");
-  Kernel.SetCapabilites(Kernel.GetCapabilities() | capIsWindows);
-  EXPECT_EQ(Kernel.GetLLDBInitFile(), "");
-
-  std::filesystem::create_directories(Root.Path() + "/bin/windows/lldbx");
-  const std::string InitFile = Root.WriteFile("bin/windows/lldbx/.lldbinit", "");
-  EXPECT_EQ(Kernel.GetLLDBInitFile(), "");
-  Kernel.FKernelType |= ktWindowsX;
-  EXPECT_EQ(Kernel.GetLLDBInitFile(), InitFile);
-  SetHostRootDirectory("");
 }
 
 } // namespace

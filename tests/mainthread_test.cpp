@@ -17,25 +17,6 @@ using namespace std::chrono_literals;
 /// Long enough never to expire on a sound run; a hang shows as a failure.
 constexpr auto GenerousWait = 30s;
 
-TEST(MainThreadQueue, DeliverRunsAtOnceOnTheMainThreadAndQueuesElsewhere) {
-  TMainThreadQueue Queue;
-  Queue.SetMainThread();
-  bool RanOnMain = false;
-  Queue.Deliver([&] { RanOnMain = true; });
-  EXPECT_TRUE(RanOnMain);
-  EXPECT_EQ(Queue.PendingCount(), 0u);
-
-  std::thread::id RanOn;
-  std::thread Other([&] {
-    EXPECT_FALSE(Queue.IsMainThread());
-    Queue.Deliver([&] { RanOn = std::this_thread::get_id(); });
-  });
-  Other.join();
-  EXPECT_EQ(Queue.PendingCount(), 1u);
-  EXPECT_EQ(Queue.ProcessPending(), 1u);
-  EXPECT_EQ(RanOn, std::this_thread::get_id());
-}
-
 TEST(MainThreadQueue, TheFirstThreadToPumpBecomesMainAndNoOtherRunsDeliveries) {
   TMainThreadQueue Queue;
   EXPECT_FALSE(Queue.IsMainThread());

@@ -26,7 +26,6 @@ class TRecordingProcess : public IGDBInternalProcess {
 public:
   // What the process answers.
   bool LLDB = false;
-  bool Windows = false;
   bool HXConsole = false;
   bool Dying = false;
   bool BreakpointHandled = false;
@@ -37,15 +36,8 @@ public:
   std::vector<std::string> Calls;
   std::vector<TStop> Suspensions;
   std::vector<std::pair<Integer, TStop>> BreakpointHits;
-  std::vector<std::pair<TGDBException, Integer>> Signals;
-  std::vector<TGDBException> Exceptions;
   std::vector<std::pair<Integer, std::string>> Exits;
-  std::vector<TGDBLogEvent> LogEvents;
   std::vector<TGDBModule> Modules;
-  std::vector<std::pair<Integer, Integer>> CreatedThreads;
-  std::vector<Integer> ExitedThreads;
-  std::vector<Integer> Pids;
-  Integer Resumptions = 0;
 
   void Register(const std::string& Key, TGDBResult& Result) { WaitObjects[Key] = &Result; }
 
@@ -53,14 +45,6 @@ public:
     char Address[32];
     std::snprintf(Address, sizeof Address, "%#llx", static_cast<unsigned long long>(Location.Address));
     return Location.Source + ":" + std::to_string(Location.Line) + "@" + (Location.Address ? Address : "0x0");
-  }
-  /// The texts logged with the given kind, in order.
-  std::vector<std::string> Logged(TGDBEvent Kind) const {
-    std::vector<std::string> Texts;
-    for (const TGDBLogEvent& Event : LogEvents)
-      if (Event.Event == Kind)
-        Texts.push_back(Event.Data);
-    return Texts;
   }
   bool Called(std::string_view Prefix) const {
     return std::any_of(Calls.begin(), Calls.end(), [&](const std::string& Call) { return Call.starts_with(Prefix); });
@@ -71,7 +55,6 @@ public:
   int32_t Release() override { return 1; }
 
   void NotifyLogEvent(const TGDBLogEvent& Event) override {
-    LogEvents.push_back(Event);
     Record("Log", std::to_string(static_cast<int>(Event.Event)) + "," + Event.Data);
   }
   void NotifyProcessStarted() override { Calls.push_back("Started"); }
@@ -79,36 +62,24 @@ public:
     Exits.emplace_back(Code, Signal);
     Record("Exited", std::to_string(Code) + "," + Signal);
   }
-  void NotifyProcessResumed() override {
-    ++Resumptions;
-    Calls.push_back("Resumed");
-  }
+  void NotifyProcessResumed() override { Calls.push_back("Resumed"); }
   void NotifyProcessFaulted(const std::string& Message) override { Record("Faulted", Message); }
   void NotifyProcessSuspended(const TGDBLocation& Location, Integer ThreadId, TThreadStopReason Reason) override {
     Suspensions.push_back({Location, ThreadId, Reason});
     Record("Suspended", Describe(Location) + "," + std::to_string(ThreadId) + "," + std::to_string(static_cast<int>(Reason)));
   }
   void NotifySignalReceived(const TGDBException& Signal, Integer ThreadId) override {
-    Signals.emplace_back(Signal, ThreadId);
     Record("Signal", Signal.Name + "," + Signal.Desc + "," + Describe(Signal.Location) + "," + std::to_string(ThreadId));
   }
   void NotifyExceptionRaised(const TGDBException& Exception, Integer ThreadId) override {
-    Exceptions.push_back(Exception);
     Record("Exception", Exception.Name + "," + std::to_string(ThreadId));
   }
   void NotifyThreadCreated(Integer ThreadId, Integer OsId) override {
-    CreatedThreads.emplace_back(ThreadId, OsId);
     Record("ThreadCreated", std::to_string(ThreadId) + "," + std::to_string(OsId));
   }
-  void NotifyThreadExited(Integer ThreadId) override {
-    ExitedThreads.push_back(ThreadId);
-    Record("ThreadExited", std::to_string(ThreadId));
-  }
+  void NotifyThreadExited(Integer ThreadId) override { Record("ThreadExited", std::to_string(ThreadId)); }
   void NotifyThreadSelected(Integer ThreadId) override { Record("ThreadSelected", std::to_string(ThreadId)); }
-  void NotifyProcessPidCreated(Integer Pid) override {
-    Pids.push_back(Pid);
-    Record("Pid", std::to_string(Pid));
-  }
+  void NotifyProcessPidCreated(Integer Pid) override { Record("Pid", std::to_string(Pid)); }
   void NotifyLanguageChanged(const std::string& Language) override { Record("Language", Language); }
   void NotifySettingMaxChildrenCountChanged(Integer Count) override { Record("MaxChildren", std::to_string(Count)); }
   void NotifyModuleLoaded(const TGDBModule& Module) override {
@@ -140,8 +111,8 @@ public:
   std::string GetEndOfLineMarker() override { return EndOfLineMarker; }
   bool IsLLDB() override { return LLDB; }
   bool IsAndroid64() override { return false; }
-  bool IsLinux() override { return !Windows; }
-  bool IsWindows() override { return Windows; }
+  bool IsLinux() override { return true; }
+  bool IsWindows() override { return false; }
   bool IsAttachMode() override { return false; }
   bool SupportHXConsole() override { return HXConsole; }
   bool IsDying() override { return Dying; }

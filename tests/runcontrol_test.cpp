@@ -1,4 +1,4 @@
-// Running, stopping, stepping, pausing, ending and detaching a program, and
+// Running, stopping, stepping, pausing and ending a program, and
 // the events the IDE hears meanwhile: against the real GDB through the
 // default "local" profile, and on the scripted fake debugger for what GDB
 // cannot be made to do.
@@ -13,10 +13,6 @@
 
 #include <algorithm>
 #include <filesystem>
-#include <fstream>
-#include <signal.h>
-#include <sys/wait.h>
-#include <unistd.h>
 
 namespace midebug {
 namespace {
@@ -43,16 +39,6 @@ public:
     CurrentNames.push_back(Process->GetModule(Module.Id).Name);
   }
 };
-
-/// The pid of the process tracing Pid, 0 when none.
-int TracerOf(int Pid) {
-  std::ifstream Status("/proc/" + std::to_string(Pid) + "/status");
-  std::string Line;
-  while (std::getline(Status, Line))
-    if (Line.rfind("TracerPid:", 0) == 0)
-      return std::atoi(Line.c_str() + 10);
-  return 0;
-}
 
 // Line numbers of tests/debuggees/stepping.c.
 constexpr Integer TwiceBodyLine = 2;
@@ -96,15 +82,6 @@ protected:
   TIntfPtr<IGDBProcess> Process;
   size_t StopsSeen = 0;
 };
-
-TEST_F(RunControl, RunReportsTheExitCode) {
-  Launch(Debuggee("stepping"));
-  Process->Run();
-  EXPECT_GT(Process->GetPid(), 1);
-  ASSERT_TRUE(Listener->PumpUntilCall("Exited("));
-  EXPECT_TRUE(Listener->HasCall("Exited(2,"));
-  EXPECT_FALSE(Listener->HasCall("Suspended("));
-}
 
 struct TMainCase {
   const char* Program;
@@ -197,16 +174,6 @@ TEST_F(RunControl, StepsReachTheListenerWithThreadLocationAndReason) {
   EXPECT_TRUE(Listener->HasCall("Exited(2,"));
 }
 
-TEST_F(RunControl, RunToEntryPointStopsAtMain) {
-  Launch(Debuggee("stepping"));
-  Process->RunToEntryPoint();
-  ASSERT_TRUE(NextStop());
-  EXPECT_EQ(StopReason(), tsrAtBreakpoint);
-  EXPECT_EQ(StopLocation().Line, MainFirstLine);
-  Process->Terminate();
-  EXPECT_TRUE(Listener->PumpUntilCall("Exited(0,"));
-}
-
 TEST_F(RunControl, PauseOfABusyLoopIsAStepStopAndResumeContinues) {
   Launch(Debuggee("busy"));
   Process->Run();
@@ -283,39 +250,6 @@ TEST_F(RunControl, SignalTheIdeKeepsIsAStopThatResumes) {
   EXPECT_TRUE(Listener->HasCall("Exited(5,"));
 }
 
-TEST_F(RunControl, SignalSetToNoStopPassNoLongerStops) {
-  Launch(Debuggee("usr1"));
-  Process->SetOsException("SIGUSR1", false, true);
-  Process->Run();
-  ASSERT_TRUE(Listener->PumpUntilCall("Exited("));
-  EXPECT_FALSE(Listener->HasCall("Signal("));
-  EXPECT_TRUE(Listener->HasCall("Exited(5,"));
-}
-
-TEST_F(RunControl, DetachLeavesTheAttachedProgramRunning) {
-  const std::string Program = Debuggee("busy");
-  const pid_t Busy = fork();
-  if (Busy == 0) {
-    if (chdir(Scratch.Path().c_str()) != 0)
-      _exit(126);
-    execl(Program.c_str(), Program.c_str(), static_cast<char*>(nullptr));
-    _exit(127);
-  }
-  Process = TGDBProcessManager::AttachProcess(Listener, Busy, "local", "Linux64", glC, gcAMD64);
-  ASSERT_TRUE(Process);
-  EXPECT_NE(TracerOf(Busy), 0);
-  Process->Detach();
-  ASSERT_TRUE(Listener->PumpUntilCall("Exited(0,"));
-  EXPECT_TRUE(ReleaseAndCheckDebuggerGone());
-  EXPECT_TRUE(ProcessRuns(Busy));
-  EXPECT_EQ(TracerOf(Busy), 0);
-  // Still running, not stopped: it takes a signal and ends by it.
-  kill(Busy, SIGTERM);
-  int Status = 0;
-  EXPECT_EQ(waitpid(Busy, &Status, 0), Busy);
-  EXPECT_TRUE(WIFSIGNALED(Status) && WTERMSIG(Status) == SIGTERM);
-}
-
 TEST_F(RunControl, LoadedAndUnloadedModulesReachTheListenerAndSetTheBaseAddress) {
   TIntfPtr<TModuleListener> Modules(new TModuleListener);
   Listener = Modules;
@@ -346,45 +280,6 @@ TEST_F(RunControl, LoadedAndUnloadedModulesReachTheListenerAndSetTheBaseAddress)
   EXPECT_GT(Plugin->Id, 0);
   for (size_t Index = 0; Index < Modules->Loaded.size(); ++Index)
     EXPECT_EQ(Modules->CurrentNames[Index], Modules->Loaded[Index].Name);
-}
-
-TEST_F(RunControl, LaunchThatCannotExecTheProgramEndsWithTheDebuggersReason) {
-  // GDB names the shell's process id before the exec fails, so the launch
-  // ends as an exit with the reason rather than as a missing process id.
-  const std::string Program = Scratch.Path() + "/stepping";
-  std::filesystem::copy_file(Debuggee("stepping"), Program);
-  std::filesystem::permissions(Program, std::filesystem::perms::owner_exec | std::filesystem::perms::group_exec |
-                                            std::filesystem::perms::others_exec,
-                               std::filesystem::perm_options::remove);
-  Launch(Program);
-  Process->Run();
-  ASSERT_TRUE(Listener->PumpUntilCall("Exited("));
-  EXPECT_TRUE(Listener->HasCallContaining("During startup program exited with code 126."));
-  EXPECT_FALSE(ProcessOf(Process).Alive());
-  EXPECT_TRUE(ReleaseAndCheckDebuggerGone());
-}
-
-TEST_F(RunControl, DebuggerDyingEndsTheSessionWithoutHanging) {
-  // GDB 13 hits a fatal signal on a variable object of a whole Pascal array.
-  Launch(Debuggee("arr"), glPascal);
-  ASSERT_TRUE(Process->SetRunToMainBreakpoint());
-  Process->Run();
-  ASSERT_TRUE(NextStop());
-  const Integer Pid = Process->GetPid();
-  TGDBProcess& Core = ProcessOf(Process);
-  TVarCreateResult Variable;
-  Core.ProcessSyncRequest("0350000000901", "0350000000901-var-create - * \"a\"", Variable);
-  EXPECT_FALSE(Variable.FAvailable && !Variable.FError);
-  ASSERT_TRUE(Listener->PumpUntilCall("Exited("));
-  EXPECT_TRUE(Listener->HasCall("InternalError(Connection to GDB kernel is no longer available"));
-  EXPECT_FALSE(Core.Alive());
-  // Nothing waits for the lost debugger any more.
-  TStackInfoDepthResult Depth;
-  Core.ProcessSyncRequest("0300000000902", "0300000000902-stack-info-depth", Depth);
-  EXPECT_FALSE(Depth.FAvailable && !Depth.FError);
-  EXPECT_TRUE(ReleaseAndCheckDebuggerGone());
-  // The program does not outlive its debugger.
-  EXPECT_TRUE(Listener->PumpUntil([&] { return !ProcessRuns(Pid); }));
 }
 
 // --- The scripted fake debugger -------------------------------------------------
