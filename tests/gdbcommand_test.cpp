@@ -3,6 +3,7 @@
 /// register name tables the register-write lines take their names from.
 
 #include "mi/gdbcommand.h"
+#include "mi/gdbregisters.h"
 #include "mi/gdbresult.h"
 #include "testsupport.h"
 

@@ -1,6 +1,6 @@
 #include "mi/gdbcommand.h"
 
-#include "mi/gdbresult.h"
+#include "mi/gdbregisters.h"
 
 #include <algorithm>
 #include <array>
@@ -35,10 +35,6 @@ constexpr std::array<TFormatNames, 6> DataValueFormats = {{
 }};
 
 constexpr std::array<std::string_view, 3> PrintValuesFormats = {"--no-values", "--all-values", "--simple-values"};
-
-// Platform names that change the register names of an AMD64 target.
-constexpr std::string_view PlatformWin64 = "Win64";
-constexpr std::string_view PlatformOSX64 = "OSX64";
 
 // -var-list-children with a range asks for children 0 to this number only, so
 // that a huge array does not stall the debugger.
@@ -108,17 +104,6 @@ std::string NumberList(const std::vector<Integer>& Numbers) {
 
 std::string NameArgument(const std::string& Name, bool Quoted) {
   return " " + (Quoted ? QuoteCString(Name) : Name);
-}
-
-/// Entry Id of Table; an id outside it is the caller's error, reported with
-/// the table's name rather than read past its end.
-template <std::size_t N>
-std::string_view RegisterName(const std::array<std::string_view, N>& Table, std::string_view TableName,
-                              Integer Id) {
-  if (Id < 0 || static_cast<std::size_t>(Id) >= N)
-    throw std::out_of_range("register id " + std::to_string(Id) + " is outside " + std::string(TableName) + " (" +
-                            std::to_string(N) + " entries)");
-  return Table[static_cast<std::size_t>(Id)];
 }
 
 UInt64 FirstInt64(const TXMMFPURegValue& Value) {
@@ -545,28 +530,13 @@ std::string TGDBCommand::CreateDataWriteRegisterValues(std::string& Token, Integ
   // The id is a position in the table the register view of this CPU shows,
   // so the name must come from that same table: on ARM32, AMD64's r10 at
   // position 8 would overwrite the wrong register.
-  std::string_view Name;
-  switch (FCPUType) {
-  case gcIA32:
-    Name = RegisterName(IA32Registers, "IA32Registers", Id);
-    break;
-  case gcARM32:
-    Name = RegisterName(ARM32Registers, "ARM32Registers", Id);
-    break;
-  case gcARM64:
-    Name = RegisterName(ARM64Registers, "ARM64Registers", Id);
-    break;
-  case gcAMD64:
-    Name = Platform == PlatformWin64 ? RegisterName(winAMD64Registers, "winAMD64Registers", Id)
-                                     : RegisterName(AMD64Registers, "AMD64Registers", Id);
-    break;
-  }
+  const std::string_view Name = GeneralRegisterTable(FCPUType, Platform).At(Id);
   return CreateDataWriteRegisterValues(Token, std::string(Name), Value);
 }
 
 std::string TGDBCommand::CreateDataWriteXMMRegisterValues(std::string& /*Token*/, Integer Id,
                                                           const TXMMFPURegValue& Value) {
-  const std::string Name(RegisterName(AMD64XMMRegisters, "AMD64XMMRegisters", Id));
+  const std::string Name(XMMRegisterTable().At(Id));
   if (Id < XMMDataRegisterCount)
     return CLLine(ctCLRegisterWrite, " " + Name + RegisterByteList(Value));
   return CLLine(ctCLRegisterWrite, " " + Name + " 0x" + UpperHex(FirstInt64(Value), 16));
@@ -575,9 +545,7 @@ std::string TGDBCommand::CreateDataWriteXMMRegisterValues(std::string& /*Token*/
 std::string TGDBCommand::CreateDataWriteFPURegisterValues(std::string& /*Token*/, Integer Id,
                                                           const TXMMFPURegValue& Value,
                                                           const std::string& Platform) {
-  const std::string Name(Platform == PlatformOSX64
-                             ? RegisterName(macAMD64FPURegisters, "macAMD64FPURegisters", Id)
-                             : RegisterName(AMD64FPURegisters, "AMD64FPURegisters", Id));
+  const std::string Name(FPURegisterTable(Platform).At(Id));
   if (Id < FPUStackRegisterCount)
     return CLLine(ctCLRegisterWrite, " " + Name + RegisterByteList(Value));
   return CLLine(ctCLRegisterWrite, " " + Name + " 0x" + UpperHex(FirstInt64(Value), 16));
