@@ -90,16 +90,6 @@ bool IsGluedResultRecord(std::string_view Text, size_t Caret) {
 
 } // namespace
 
-int HexDigitValue(char Digit) {
-  if (IsDigit(Digit))
-    return Digit - '0';
-  if (Digit >= 'a' && Digit <= 'f')
-    return Digit - 'a' + 10;
-  if (Digit >= 'A' && Digit <= 'F')
-    return Digit - 'A' + 10;
-  return -1;
-}
-
 std::string_view TrimBlanks(std::string_view Text) {
   while (!Text.empty() && IsBlank(Text.front()))
     Text.remove_prefix(1);
