@@ -154,10 +154,6 @@ bool XMMRegisterEqual(const TXMMFPURegValue& A, const TXMMFPURegValue& B) {
   return std::memcmp(&A, &B, sizeof(TXMMFPURegValue)) == 0;
 }
 
-bool FPURegisterEqual(const TXMMFPURegValue& A, const TXMMFPURegValue& B) {
-  return std::memcmp(&A, &B, sizeof(TXMMFPURegValue)) == 0;
-}
-
 TGDBCommand::TGDBCommand(TGDBCPU CPU) : FAddressDigits(CPU == gcAMD64 || CPU == gcARM64 ? 16 : 8), FCPUType(CPU) {}
 
 std::string TGDBCommand::CreateMiCommand(TMiCommand Command, std::string& Token) {

@@ -85,8 +85,8 @@ static_assert(sizeof(TXMMFPURegValue) == 16);
 bool IsProcessLaunchCommand(const std::string& Token);
 /// True when all 16 bytes are equal.
 bool XMMRegisterEqual(const TXMMFPURegValue& A, const TXMMFPURegValue& B);
-/// True when all 16 bytes are equal.
-bool FPURegisterEqual(const TXMMFPURegValue& A, const TXMMFPURegValue& B);
+/// An x87 value is compared as an SSE value is: all 16 bytes.
+inline constexpr auto& FPURegisterEqual = XMMRegisterEqual;
 
 /// Builds the command lines of one debugged process.
 ///

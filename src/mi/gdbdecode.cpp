@@ -60,6 +60,7 @@ std::string_view TakeNext(TMIScanner& Scanner, std::string_view Name) {
 
 namespace {
 
+using decode::As;
 using decode::FindResult;
 using decode::ForEachElement;
 using decode::TakeNext;
@@ -72,11 +73,6 @@ constexpr Integer MaxFrameLevel = 100000;
 constexpr Integer MaxThreadCount = 100000;
 /// GDB's answer for a variable object with very many children reads as this.
 constexpr Integer MaxNumChild = 5000;
-
-template <typename TResult>
-TResult* As(TGDBResult& Result) {
-  return dynamic_cast<TResult*>(&Result);
-}
 
 std::string Text(std::string_view Value) { return std::string(Value); }
 
@@ -557,9 +553,9 @@ bool DecodeResult(TGDBResult& Result, TMIScanner& Scanner, bool IsLLDB) {
   case ctDataListRegisterValues:
     return decode::DecodeDataListRegisterValues(Result, Scanner);
   case ctDataListXMMRegisterValues:
-    return decode::DecodeDataListXMMRegisterValues(Result, Scanner);
+    return decode::DecodeDataListVectorRegisterValues<TDataListXMMRegisterValuesResult>(Result, Scanner);
   case ctDataListFPURegisterValues:
-    return decode::DecodeDataListFPURegisterValues(Result, Scanner);
+    return decode::DecodeDataListVectorRegisterValues<TDataListFPURegisterValuesResult>(Result, Scanner);
   case ctDataReadMemory:
     return decode::DecodeDataReadMemory(Result, Scanner);
   case ctDataReadMemoryBytes:

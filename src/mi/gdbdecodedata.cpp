@@ -12,11 +12,6 @@ namespace midebug::decode {
 
 namespace {
 
-template <typename TResult>
-TResult* As(TGDBResult& Result) {
-  return dynamic_cast<TResult*>(&Result);
-}
-
 // --- Disassembly ------------------------------------------------------------
 
 /// The instruction's length: "size" where the debugger gives it, else the
@@ -362,21 +357,17 @@ bool DecodeDataListRegisterValues(TGDBResult& Result, TMIScanner& Scanner) {
                             });
 }
 
-bool DecodeDataListXMMRegisterValues(TGDBResult& Result, TMIScanner& Scanner) {
-  auto* Registers = As<TDataListXMMRegisterValuesResult>(Result);
+template <typename TResult>
+bool DecodeDataListVectorRegisterValues(TGDBResult& Result, TMIScanner& Scanner) {
+  auto* Registers = As<TResult>(Result);
   if (!Registers)
     return false;
   return ReadRegisterValues(Scanner, Registers->FIds, Registers->FId, Registers->FValue, Registers->FValues,
                             [](std::string_view Text, Integer) { return ParseVectorValue(Text, DummyXMMRegValue); });
 }
 
-bool DecodeDataListFPURegisterValues(TGDBResult& Result, TMIScanner& Scanner) {
-  auto* Registers = As<TDataListFPURegisterValuesResult>(Result);
-  if (!Registers)
-    return false;
-  return ReadRegisterValues(Scanner, Registers->FIds, Registers->FId, Registers->FValue, Registers->FValues,
-                            [](std::string_view Text, Integer) { return ParseVectorValue(Text, DummyFPURegValue); });
-}
+template bool DecodeDataListVectorRegisterValues<TDataListXMMRegisterValuesResult>(TGDBResult&, TMIScanner&);
+template bool DecodeDataListVectorRegisterValues<TDataListFPURegisterValuesResult>(TGDBResult&, TMIScanner&);
 
 bool DecodeDataReadMemory(TGDBResult& Result, TMIScanner& Scanner) {
   auto* Memory = As<TDataReadMemoryResult>(Result);

@@ -10,6 +10,12 @@
 
 namespace midebug::decode {
 
+/// Result as the result class TResult, or null when it is another one.
+template <typename TResult>
+TResult* As(TGDBResult& Result) {
+  return dynamic_cast<TResult*>(&Result);
+}
+
 /// True when a result called Name stands among the results at the cursor,
 /// with its value in Value (possibly empty, as in "threads=[]"). The cursor
 /// does not move.
@@ -49,8 +55,10 @@ void ForEachElement(TMIScanner& Scanner, std::string_view ListText, TVisit&& Vis
 bool DecodeDataDisassemble(TGDBResult& Result, TMIScanner& Scanner);
 bool DecodeDataListRegisterNames(TGDBResult& Result, TMIScanner& Scanner);
 bool DecodeDataListRegisterValues(TGDBResult& Result, TMIScanner& Scanner);
-bool DecodeDataListXMMRegisterValues(TGDBResult& Result, TMIScanner& Scanner);
-bool DecodeDataListFPURegisterValues(TGDBResult& Result, TMIScanner& Scanner);
+/// TResult is TDataListXMMRegisterValuesResult or
+/// TDataListFPURegisterValuesResult: both read the same 16-byte values.
+template <typename TResult>
+bool DecodeDataListVectorRegisterValues(TGDBResult& Result, TMIScanner& Scanner);
 bool DecodeDataReadMemory(TGDBResult& Result, TMIScanner& Scanner);
 bool DecodeDataReadMemoryBytes(TGDBResult& Result, TMIScanner& Scanner);
 bool DecodeDataInfoLine(TGDBResult& Result, TMIScanner& Scanner);

@@ -153,18 +153,6 @@ TDataListRegisterValuesResult::TDataListRegisterValuesResult(const TIntegerArray
 TDataListRegisterValuesResult::TDataListRegisterValuesResult(Integer Id, bool HasCpsr)
     : TGDBResult(ctDataListRegisterValues), FId(Id), FCpsrIndex(HasCpsr ? 0 : -1) {}
 
-TDataListXMMRegisterValuesResult::TDataListXMMRegisterValuesResult(const TIntegerArray& Ids)
-    : TGDBResult(ctDataListXMMRegisterValues), FIds(Ids) {}
-
-TDataListXMMRegisterValuesResult::TDataListXMMRegisterValuesResult(Integer Id)
-    : TGDBResult(ctDataListXMMRegisterValues), FId(Id) {}
-
-TDataListFPURegisterValuesResult::TDataListFPURegisterValuesResult(const TIntegerArray& Ids)
-    : TGDBResult(ctDataListFPURegisterValues), FIds(Ids) {}
-
-TDataListFPURegisterValuesResult::TDataListFPURegisterValuesResult(Integer Id)
-    : TGDBResult(ctDataListFPURegisterValues), FId(Id) {}
-
 TDataEvaluateExpressionResult::TDataEvaluateExpressionResult() : TGDBResult(ctDataEvaluateExpression) {}
 
 TGdbShowResult::TGdbShowResult() : TGDBResult(ctGdbShow) {}

@@ -109,7 +109,8 @@ inline const TGDBModule DummyModule = [] {
   return Module;
 }();
 inline const TXMMFPURegValue DummyXMMRegValue{};
-inline const TXMMFPURegValue DummyFPURegValue{};
+/// x87 and SSE registers read as the same 16 zero bytes.
+inline const TXMMFPURegValue& DummyFPURegValue = DummyXMMRegValue;
 
 // ---------------------------------------------------------------------------
 // Result objects
@@ -407,24 +408,28 @@ public:
   Integer FCpsrIndex;
 };
 
-class TDataListXMMRegisterValuesResult : public TGDBResult {
+/// x87 or SSE register values, 16 bytes each, asked for by a list of ids or
+/// one id. The two differ only in their command, by which the reply decoder
+/// knows what it is filling.
+template <TMiCommand Command>
+class TDataListVectorRegisterValuesResult : public TGDBResult {
 public:
-  explicit TDataListXMMRegisterValuesResult(const TIntegerArray& Ids);
-  explicit TDataListXMMRegisterValuesResult(Integer Id);
-  TXMMRegValueArray FValues;
+  explicit TDataListVectorRegisterValuesResult(const TIntegerArray& Ids) : TGDBResult(Command), FIds(Ids) {}
+  explicit TDataListVectorRegisterValuesResult(Integer Id) : TGDBResult(Command), FId(Id) {}
+  std::vector<TXMMFPURegValue> FValues;
   TIntegerArray FIds;
   Integer FId = 0;
   TXMMFPURegValue FValue{};
 };
 
-class TDataListFPURegisterValuesResult : public TGDBResult {
+class TDataListXMMRegisterValuesResult : public TDataListVectorRegisterValuesResult<ctDataListXMMRegisterValues> {
 public:
-  explicit TDataListFPURegisterValuesResult(const TIntegerArray& Ids);
-  explicit TDataListFPURegisterValuesResult(Integer Id);
-  TFPURegValueArray FValues;
-  TIntegerArray FIds;
-  Integer FId = 0;
-  TXMMFPURegValue FValue{};
+  using TDataListVectorRegisterValuesResult::TDataListVectorRegisterValuesResult;
+};
+
+class TDataListFPURegisterValuesResult : public TDataListVectorRegisterValuesResult<ctDataListFPURegisterValues> {
+public:
+  using TDataListVectorRegisterValuesResult::TDataListVectorRegisterValuesResult;
 };
 
 /// The register tables shown for a CPU and platform, and the debugger's own
