@@ -127,8 +127,11 @@ public:
 private:
   std::string_view ScanCString(bool Keep);
   std::string_view ScanDelimited(char Open, char Close);
-  std::string_view ScanTuple();
-  std::string_view ScanList();
+  /// The inner text of the tuple ("{", "}") or list ("[", "]") at the
+  /// cursor, or empty when it is not closed.
+  std::string_view ScanContainer(char Open, char Close);
+  /// ScanContainer, or empty beyond MaxNesting levels.
+  std::string_view ReadContainer(char Open, char Close);
   std::string_view ScanValue(bool Keep);
   void SkipValue() { ScanValue(false); }
   bool IsPromptLine(std::string_view Line, std::string_view EndOfLineMarker) const;
