@@ -3,6 +3,7 @@
 /// text: padding, escaping, option order and flags; their tokens and keys.
 
 #include "mi/gdbcommand.h"
+#include "mi/gdbregisters.h"
 #include "mi/gdbresult.h"
 #include "testsupport.h"
 

@@ -463,4 +463,18 @@ TEST(DecoderOther, ProcessAndTargetAnswers) {
   EXPECT_FALSE(Decode(Unknown, R"(3^done,other="true")"));
 }
 
+TEST(DecoderOther, ResultOfAnotherClassThanItsCommandIsNotFilled) {
+  // The decoder is chosen by the command, the fields by the class: a result
+  // object whose command names another class must fail, not be overwritten.
+  TPidInfoResult Pid;
+  Pid.FCommand = ctStackInfoDepth;
+  EXPECT_FALSE(Decode(Pid, R"(3^done,depth="4")"));
+  EXPECT_EQ(Pid.FPid, 0);
+  // x87 and SSE results share their layout but not their class.
+  TDataListFPURegisterValuesResult Fpu(40);
+  Fpu.FCommand = ctDataListXMMRegisterValues;
+  EXPECT_FALSE(Decode(Fpu, R"(3^done,register-values=[{number="40",value="0x1"}])"));
+  EXPECT_EQ(BytesOf(Fpu.FValue), Bytes16({}));
+}
+
 } // namespace

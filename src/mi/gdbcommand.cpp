@@ -1,143 +1,20 @@
 #include "mi/gdbcommand.h"
 
-#include "mi/gdbresult.h"
+#include "mi/gdbregisters.h"
 
 #include <algorithm>
 #include <array>
 #include <charconv>
 #include <cstdio>
 #include <cstring>
-#include <stdexcept>
 
 namespace midebug {
 
 namespace {
 
 constexpr std::array<std::string_view, MiCommandCount> MiCommandTexts = {
-    "",
-    "-break-after",
-    "-break-condition",
-    "-break-delete",
-    "-break-disable",
-    "-break-enable",
-    "-break-info",
-    "-break-insert",
-    "-break-list",
-    "-break-watch",
-    "-exec-arguments",
-    "-exec-show-arguments",
-    "-environment-cd",
-    "-environment-directory",
-    "-environment-path",
-    "-environment-pwd",
-    "-thread-info",
-    "-thread-list-ids",
-    "-thread-select",
-    "-exec-continue",
-    "-exec-finish",
-    "-exec-interrupt",
-    "-exec-next",
-    "-exec-next-instruction",
-    "-exec-return",
-    "-exec-run",
-    "-exec-step",
-    "-exec-step-instruction",
-    "-exec-until",
-    "-stack-info-frame",
-    "-stack-info-depth",
-    "-stack-list-arguments",
-    "-stack-list-frames",
-    "-stack-list-locals",
-    "-stack-select-frame",
-    "-var-create",
-    "-var-delete",
-    "-var-set-format",
-    "-var-show-format",
-    "-var-info-num-children",
-    "-var-list-children",
-    "-var-info-type",
-    "-var-info-expression",
-    "-var-info-path-expression",
-    "-var-show-attributes",
-    "-var-evaluate-expression",
-    "-var-assign",
-    "-var-update",
-    "-var-set-frozen",
-    "-data-disassemble",
-    "-data-evaluate-expression",
-    "-data-list-changed-registers",
-    "-data-list-register-names",
-    "-data-list-register-values",
-    "-data-write-register-values",
-    "-data-list-register-values",
-    "-data-write-register-values",
-    "-data-list-register-values",
-    "-data-write-register-values",
-    "-data-read-memory",
-    "-data-read-memory-bytes",
-    "-data-info-line",
-    "-symbol-info-address",
-    "-symbol-info-file",
-    "-symbol-info-function",
-    "-symbol-info-line",
-    "-symbol-info-symbol",
-    "-symbol-list-functions",
-    "-symbol-list-lines",
-    "-symbol-list-types",
-    "-symbol-list-variables",
-    "-symbol-locate",
-    "-symbol-type",
-    "-file-exec-and-symbols",
-    "-file-exec-file",
-    "-file-list-exec-sections",
-    "-file-list-exec-source-file",
-    "-file-list-exec-source-files",
-    "-file-list-shared-libraries",
-    "-file-list-symbol-files",
-    "-file-symbol-file",
-    "-target-attach",
-    "-target-compare-sections",
-    "-target-detach",
-    "-target-disconnect",
-    "-target-download",
-    "-target-exec-status",
-    "-target-list-available-targets",
-    "-target-list-current-targets",
-    "-target-list-parameters",
-    "-target-select",
-    "-target-file-put",
-    "-target-file-get",
-    "-target-file-delete",
-    "-gdb-exit",
-    "-exec-abort",
-    "-gdb-set",
-    "-gdb-show",
-    "-gdb-version",
-    "-list-features",
-    "-list-target-features",
-    "-list-thread-groups",
-    "-add-inferior",
-    "-interpreter-exec",
-    "-inferior-tty-set",
-    "-inferior-tty-show",
-    "-enable-timings",
-    "-pid-info",
-    "-target-info-async",
-    "-enable-debughook",
-    "info line",
-    "set variable",
-    "set environment",
-    "kill",
-    "handle",
-    "settings set target.env-vars",
-    "register write",
-    "settings set",
-    "settings show",
-    "process handle",
-    "thread select",
-    "command source",
-    "memory write",
-    "process attach",
+#define MI_COMMAND(Enumerator, Text) Text,
+#include "mi/micommands.def"
 };
 
 struct TFormatNames {
@@ -157,10 +34,6 @@ constexpr std::array<TFormatNames, 6> DataValueFormats = {{
 }};
 
 constexpr std::array<std::string_view, 3> PrintValuesFormats = {"--no-values", "--all-values", "--simple-values"};
-
-// Platform names that change the register names of an AMD64 target.
-constexpr std::string_view PlatformWin64 = "Win64";
-constexpr std::string_view PlatformOSX64 = "OSX64";
 
 // -var-list-children with a range asks for children 0 to this number only, so
 // that a huge array does not stall the debugger.
@@ -232,17 +105,6 @@ std::string NameArgument(const std::string& Name, bool Quoted) {
   return " " + (Quoted ? QuoteCString(Name) : Name);
 }
 
-/// Entry Id of Table; an id outside it is the caller's error, reported with
-/// the table's name rather than read past its end.
-template <std::size_t N>
-std::string_view RegisterName(const std::array<std::string_view, N>& Table, std::string_view TableName,
-                              Integer Id) {
-  if (Id < 0 || static_cast<std::size_t>(Id) >= N)
-    throw std::out_of_range("register id " + std::to_string(Id) + " is outside " + std::string(TableName) + " (" +
-                            std::to_string(N) + " entries)");
-  return Table[static_cast<std::size_t>(Id)];
-}
-
 UInt64 FirstInt64(const TXMMFPURegValue& Value) {
   UInt64 Number;
   std::memcpy(&Number, &Value, sizeof(Number));
@@ -288,10 +150,6 @@ bool IsProcessLaunchCommand(const std::string& Token) {
 }
 
 bool XMMRegisterEqual(const TXMMFPURegValue& A, const TXMMFPURegValue& B) {
-  return std::memcmp(&A, &B, sizeof(TXMMFPURegValue)) == 0;
-}
-
-bool FPURegisterEqual(const TXMMFPURegValue& A, const TXMMFPURegValue& B) {
   return std::memcmp(&A, &B, sizeof(TXMMFPURegValue)) == 0;
 }
 
@@ -667,28 +525,13 @@ std::string TGDBCommand::CreateDataWriteRegisterValues(std::string& Token, Integ
   // The id is a position in the table the register view of this CPU shows,
   // so the name must come from that same table: on ARM32, AMD64's r10 at
   // position 8 would overwrite the wrong register.
-  std::string_view Name;
-  switch (FCPUType) {
-  case gcIA32:
-    Name = RegisterName(IA32Registers, "IA32Registers", Id);
-    break;
-  case gcARM32:
-    Name = RegisterName(ARM32Registers, "ARM32Registers", Id);
-    break;
-  case gcARM64:
-    Name = RegisterName(ARM64Registers, "ARM64Registers", Id);
-    break;
-  case gcAMD64:
-    Name = Platform == PlatformWin64 ? RegisterName(winAMD64Registers, "winAMD64Registers", Id)
-                                     : RegisterName(AMD64Registers, "AMD64Registers", Id);
-    break;
-  }
+  const std::string_view Name = GeneralRegisterTable(FCPUType, Platform).At(Id);
   return CreateDataWriteRegisterValues(Token, std::string(Name), Value);
 }
 
 std::string TGDBCommand::CreateDataWriteXMMRegisterValues(std::string& /*Token*/, Integer Id,
                                                           const TXMMFPURegValue& Value) {
-  const std::string Name(RegisterName(AMD64XMMRegisters, "AMD64XMMRegisters", Id));
+  const std::string Name(XMMRegisterTable().At(Id));
   if (Id < XMMDataRegisterCount)
     return CLLine(ctCLRegisterWrite, " " + Name + RegisterByteList(Value));
   return CLLine(ctCLRegisterWrite, " " + Name + " 0x" + UpperHex(FirstInt64(Value), 16));
@@ -697,9 +540,7 @@ std::string TGDBCommand::CreateDataWriteXMMRegisterValues(std::string& /*Token*/
 std::string TGDBCommand::CreateDataWriteFPURegisterValues(std::string& /*Token*/, Integer Id,
                                                           const TXMMFPURegValue& Value,
                                                           const std::string& Platform) {
-  const std::string Name(Platform == PlatformOSX64
-                             ? RegisterName(macAMD64FPURegisters, "macAMD64FPURegisters", Id)
-                             : RegisterName(AMD64FPURegisters, "AMD64FPURegisters", Id));
+  const std::string Name(FPURegisterTable(Platform).At(Id));
   if (Id < FPUStackRegisterCount)
     return CLLine(ctCLRegisterWrite, " " + Name + RegisterByteList(Value));
   return CLLine(ctCLRegisterWrite, " " + Name + " 0x" + UpperHex(FirstInt64(Value), 16));

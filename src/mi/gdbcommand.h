@@ -15,139 +15,27 @@
 
 namespace midebug {
 
-/// Every command midebug can issue. 1 to 109 are MI commands, 110 to 123 CLI
-/// commands. The ordinal is part of the token, so the values must not move.
-/// Three list and three write values share one MI command each: they exist so
-/// that the reply decoder can tell which result it is filling.
+/// Every command midebug can issue, as listed in mi/micommands.def. 1 to 109
+/// are MI commands, 110 to 123 CLI commands. The ordinal is part of the token,
+/// so the values must not move. Three list and three write values share one MI
+/// command each: they exist so that the reply decoder can tell which result it
+/// is filling.
 enum TMiCommand : uint8_t {
-  ctUnknown = 0,
-  ctBreakAfter = 1,
-  ctBreakCondition = 2,
-  ctBreakDelete = 3,
-  ctBreakDisable = 4,
-  ctBreakEnable = 5,
-  ctBreakInfo = 6,
-  ctBreakInsert = 7,
-  ctBreakList = 8,
-  ctBreakWatch = 9,
-  ctExecArguments = 10,
-  ctExecShowArguments = 11,
-  ctEnvironmentCd = 12,
-  ctEnvironmentDirectory = 13,
-  ctEnvironmentPath = 14,
-  ctEnvironmentPwd = 15,
-  ctThreadInfo = 16,
-  ctThreadListIds = 17,
-  ctThreadSelect = 18,
-  ctExecContinue = 19,
-  ctExecFinish = 20,
-  ctExecInterrupt = 21,
-  ctExecNext = 22,
-  ctExecNextInstruction = 23,
-  ctExecReturn = 24,
-  ctExecRun = 25,
-  ctExecStep = 26,
-  ctExecStepInstruction = 27,
-  ctExecUntil = 28,
-  ctStackInfoFrame = 29,
-  ctStackInfoDepth = 30,
-  ctStackListArguments = 31,
-  ctStackListFrames = 32,
-  ctStackListLocals = 33,
-  ctStackSelectFrame = 34,
-  ctVarCreate = 35,
-  ctVarDelete = 36,
-  ctVarSetFormat = 37,
-  ctVarShowFormat = 38,
-  ctVarInfoNumChildren = 39,
-  ctVarListChildren = 40,
-  ctVarInfoType = 41,
-  ctVarInfoExpression = 42,
-  ctVarInfoPathExpression = 43,
-  ctVarShowAttributes = 44,
-  ctVarEvaluateExpression = 45,
-  ctVarAssign = 46,
-  ctVarUpdate = 47,
-  ctVarSetFrozen = 48,
-  ctDataDisassemble = 49,
-  ctDataEvaluateExpression = 50,
-  ctDataListChangedRegisters = 51,
-  ctDataListRegisterNames = 52,
-  ctDataListRegisterValues = 53,
-  ctDataWriteRegisterValues = 54,
-  ctDataListXMMRegisterValues = 55,
-  ctDataWriteXMMRegisterValues = 56,
-  ctDataListFPURegisterValues = 57,
-  ctDataWriteFPURegisterValues = 58,
-  ctDataReadMemory = 59,
-  ctDataReadMemoryBytes = 60,
-  ctDataInfoLine = 61,
-  ctSymbolInfoAddress = 62,
-  ctSymbolInfoFile = 63,
-  ctSymbolInfoFunction = 64,
-  ctSymbolInfoLine = 65,
-  ctSymbolInfoSymbol = 66,
-  ctSymbolListFunctions = 67,
-  ctSymbolListLines = 68,
-  ctSymbolListTypes = 69,
-  ctSymbolListVariables = 70,
-  ctSymbolLocate = 71,
-  ctSymbolType = 72,
-  ctFileExecAndSymbols = 73,
-  ctFileExecFile = 74,
-  ctFileListExecSections = 75,
-  ctFileListExecSourceFile = 76,
-  ctFileListExecSourceFiles = 77,
-  ctFileListSharedLibraries = 78,
-  ctFileListSymbolFiles = 79,
-  ctFileSymbolFile = 80,
-  ctTargetAttach = 81,
-  ctTargetCompareSections = 82,
-  ctTargetDetach = 83,
-  ctTargetDisconnect = 84,
-  ctTargetDownload = 85,
-  ctTargetExecStatus = 86,
-  ctTargetListAvailableTargets = 87,
-  ctTargetListCurrentTargets = 88,
-  ctTargetListParameters = 89,
-  ctTargetSelect = 90,
-  ctTargetFilePut = 91,
-  ctTargetFileGet = 92,
-  ctTargetFileDelete = 93,
-  ctGdbExit = 94,
-  ctExecAbort = 95,
-  ctGdbSet = 96,
-  ctGdbShow = 97,
-  ctGdbVersion = 98,
-  ctListFeatures = 99,
-  ctListTargetFeatures = 100,
-  ctListThreadGroups = 101,
-  ctAddInferior = 102,
-  ctInterpreterExec = 103,
-  ctInferiorTtySet = 104,
-  ctInferiorTtyShow = 105,
-  ctEnableTimings = 106,
-  ctPidInfo = 107,
-  ctTargetInfoAsync = 108,
-  ctEnableDebugHook = 109,
-  ctCLInfoLineAddress = 110,
-  ctCLSetVariable = 111,
-  ctCLSetEnvironment = 112,
-  ctCLKill = 113,
-  ctCLHandle = 114,
-  ctCLSetTargetEnvironment = 115,
-  ctCLRegisterWrite = 116,
-  ctCLSettingsSet = 117,
-  ctCLSettingsShow = 118,
-  ctCLProcessHandle = 119,
-  ctCLThreadSelect = 120,
-  ctCLCommandSource = 121,
-  ctCLMemoryWrite = 122,
-  ctCLProcessAttach = 123,
+#define MI_COMMAND(Enumerator, Text) Enumerator,
+#include "mi/micommands.def"
 };
 
 /// Number of TMiCommand values.
-inline constexpr std::size_t MiCommandCount = 124;
+inline constexpr std::size_t MiCommandCount = 0
+#define MI_COMMAND(Enumerator, Text) +1
+#include "mi/micommands.def"
+    ;
+
+// Tokens carry the ordinal, and so do recorded transcripts: a line inserted
+// into the catalogue anywhere but at its end would renumber the commands
+// after it.
+static_assert(ctExecRun == 25 && ctEnableDebugHook == 109, "MI command ordinals moved");
+static_assert(ctCLInfoLineAddress == 110 && ctCLProcessAttach == 123, "CLI command ordinals moved");
 
 /// The text that starts the command's line; empty for ctUnknown and for any
 /// value outside the enumeration.
@@ -197,8 +85,8 @@ static_assert(sizeof(TXMMFPURegValue) == 16);
 bool IsProcessLaunchCommand(const std::string& Token);
 /// True when all 16 bytes are equal.
 bool XMMRegisterEqual(const TXMMFPURegValue& A, const TXMMFPURegValue& B);
-/// True when all 16 bytes are equal.
-bool FPURegisterEqual(const TXMMFPURegValue& A, const TXMMFPURegValue& B);
+/// An x87 value is compared as an SSE value is: all 16 bytes.
+inline constexpr auto& FPURegisterEqual = XMMRegisterEqual;
 
 /// Builds the command lines of one debugged process.
 ///

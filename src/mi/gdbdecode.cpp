@@ -60,6 +60,7 @@ std::string_view TakeNext(TMIScanner& Scanner, std::string_view Name) {
 
 namespace {
 
+using decode::DecodeAs;
 using decode::FindResult;
 using decode::ForEachElement;
 using decode::TakeNext;
@@ -72,11 +73,6 @@ constexpr Integer MaxFrameLevel = 100000;
 constexpr Integer MaxThreadCount = 100000;
 /// GDB's answer for a variable object with very many children reads as this.
 constexpr Integer MaxNumChild = 5000;
-
-template <typename TResult>
-TResult* As(TGDBResult& Result) {
-  return dynamic_cast<TResult*>(&Result);
-}
 
 std::string Text(std::string_view Value) { return std::string(Value); }
 
@@ -129,42 +125,36 @@ void ReadBreakpointLocations(TMIScanner& Scanner, std::string_view Locations, TB
     Breakpoint.FAddresses = std::move(Addresses);
 }
 
-bool DecodeBreakInsert(TGDBResult& Result, TMIScanner& Scanner) {
-  auto* Breakpoint = As<TBreakInsertResult>(Result);
-  if (!Breakpoint)
-    return false;
+bool DecodeBreakInsert(TBreakInsertResult& Breakpoint, TMIScanner& Scanner) {
   const std::string_view Bkpt = TakeNext(Scanner, "bkpt");
   if (!Bkpt.empty()) {
     std::string_view Locations;
     {
       TMIScanner::TNestedScan InBkpt(Scanner, Bkpt);
-      Breakpoint->FBreakpoint = Scanner.FindInteger("number", -1);
-      if (Breakpoint->FBreakpoint == -1)
+      Breakpoint.FBreakpoint = Scanner.FindInteger("number", -1);
+      if (Breakpoint.FBreakpoint == -1)
         return false;
-      ParseLocation(Scanner, Breakpoint->FLocation);
+      ParseLocation(Scanner, Breakpoint.FLocation);
       FindResult(Scanner, "locations", Locations);
     }
     // The cursor is now after "bkpt", on the location tuples GDB 13 puts
     // beside it.
-    ReadBreakpointLocations(Scanner, Locations, *Breakpoint);
+    ReadBreakpointLocations(Scanner, Locations, Breakpoint);
     return true;
   }
-  Breakpoint->FAddresses.clear();
+  Breakpoint.FAddresses.clear();
   const std::string_view Matches = Scanner.FindValue("matches");
   if (Matches.empty())
     return false;
   TMIScanner::TNestedScan InMatches(Scanner, Matches);
   for (std::string_view Match = TakeNext(Scanner, "b"); !Match.empty(); Match = TakeNext(Scanner, "b")) {
     TMIScanner::TNestedScan InMatch(Scanner, Match);
-    Breakpoint->FAddresses.push_back(Scanner.FindUInt64("addr", 0));
+    Breakpoint.FAddresses.push_back(Scanner.FindUInt64("addr", 0));
   }
   return true;
 }
 
-bool DecodeBreakWatch(TGDBResult& Result, TMIScanner& Scanner) {
-  auto* Watch = As<TBreakWatchResult>(Result);
-  if (!Watch)
-    return false;
+bool DecodeBreakWatch(TBreakWatchResult& Watch, TMIScanner& Scanner) {
   // GDB names read and access watchpoints "hw-rwpt" and "hw-awpt".
   std::string_view Tuple = Scanner.FindValue("wpt");
   if (Tuple.empty())
@@ -172,17 +162,16 @@ bool DecodeBreakWatch(TGDBResult& Result, TMIScanner& Scanner) {
   if (Tuple.empty())
     Tuple = Scanner.FindValue("hw-rwpt");
   TMIScanner::TNestedScan InTuple(Scanner, Tuple);
-  Watch->FBreakpoint = Scanner.FindInteger("number", -1);
-  if (Watch->FBreakpoint == -1)
+  Watch.FBreakpoint = Scanner.FindInteger("number", -1);
+  if (Watch.FBreakpoint == -1)
     return false;
-  Watch->FLocation = DummyLocation;
+  Watch.FLocation = DummyLocation;
   return true;
 }
 
-bool DecodeThreadInfo(TGDBResult& Result, TMIScanner& Scanner) {
-  auto* Info = As<TThreadInfoResult>(Result);
+bool DecodeThreadInfo(TThreadInfoResult& Info, TMIScanner& Scanner) {
   std::string_view Threads;
-  if (!Info || !FindResult(Scanner, "threads", Threads))
+  if (!FindResult(Scanner, "threads", Threads))
     return false;
   ForEachElement(Scanner, Threads, [&](std::string_view Element) {
     if (Element.empty())
@@ -190,39 +179,36 @@ bool DecodeThreadInfo(TGDBResult& Result, TMIScanner& Scanner) {
     const Integer Id = Scanner.FindInteger("id", -1);
     if (Id == -1)
       return;
-    Info->FIds.push_back(Id);
-    if (!Info->FStateOnly)
-      Info->FNames.push_back(TThreadInfoResult::FixupName(Text(Scanner.FindValue("target-id"))));
+    Info.FIds.push_back(Id);
+    if (!Info.FStateOnly)
+      Info.FNames.push_back(TThreadInfoResult::FixupName(Text(Scanner.FindValue("target-id"))));
     TGDBLocation Location;
     Integer IgnoredThreadId = -1;
     ParseStopFrame(Scanner, Location, IgnoredThreadId);
-    Info->FLocations.push_back(std::move(Location));
-    Info->FStates.push_back(Text(Scanner.FindValue("state")));
+    Info.FLocations.push_back(std::move(Location));
+    Info.FStates.push_back(Text(Scanner.FindValue("state")));
   });
   return true;
 }
 
-bool DecodeThreadListIds(TGDBResult& Result, TMIScanner& Scanner) {
-  auto* List = As<TThreadListIdsResult>(Result);
-  if (!List)
-    return false;
+bool DecodeThreadListIds(TThreadListIdsResult& List, TMIScanner& Scanner) {
   Integer Count = Scanner.FindInteger("number-of-threads", 0);
   if (Count > MaxThreadCount)
     Count = MaxThreadCount;
   const size_t Size = Count > 0 ? static_cast<size_t>(Count) : 0;
-  List->FIds.assign(Size, 0);
-  List->FNames.assign(Size, std::string());
-  List->FStates.assign(Size, std::string());
+  List.FIds.assign(Size, 0);
+  List.FNames.assign(Size, std::string());
+  List.FStates.assign(Size, std::string());
   if (Size == 0)
     return true;
   {
     TMIScanner::TNestedScan InIds(Scanner, Scanner.FindValue("thread-ids"));
-    for (Integer& Id : List->FIds)
+    for (Integer& Id : List.FIds)
       Id = MIStrToIntDef(TakeNext(Scanner, "thread-id"), -1);
   }
   std::multimap<Integer, size_t> SlotsById;
   for (size_t Slot = 0; Slot < Size; ++Slot)
-    SlotsById.emplace(List->FIds[Slot], Slot);
+    SlotsById.emplace(List.FIds[Slot], Slot);
   TMIScanner::TNestedScan InThreads(Scanner, Scanner.FindValue("threads"));
   for (size_t Index = 0; Index < Size; ++Index) {
     const std::string_view Thread = TakeNext(Scanner, "thread");
@@ -234,50 +220,42 @@ bool DecodeThreadListIds(TGDBResult& Result, TMIScanner& Scanner) {
     const std::string UniqueId = Text(Scanner.FindValue("unique-id"));
     const auto [First, Last] = SlotsById.equal_range(Id);
     for (auto Slot = First; Slot != Last; ++Slot) {
-      List->FStates[Slot->second] = State;
-      List->FNames[Slot->second] = UniqueId;
+      List.FStates[Slot->second] = State;
+      List.FNames[Slot->second] = UniqueId;
     }
   }
   return true;
 }
 
-bool DecodeThreadSelect(TGDBResult& Result, TMIScanner& Scanner) {
-  auto* Select = As<TThreadSelectResult>(Result);
-  if (!Select || Scanner.FindInteger("new-thread-id", -1) != Select->FThreadId)
+bool DecodeThreadSelect(TThreadSelectResult& Select, TMIScanner& Scanner) {
+  if (Scanner.FindInteger("new-thread-id", -1) != Select.FThreadId)
     return false;
   const std::string_view Frame = Scanner.FindValue("frame");
   if (Frame.empty())
     return false;
   TMIScanner::TNestedScan InFrame(Scanner, Frame);
-  Select->FFrameIndex = Scanner.FindInteger("level", 0);
-  ParseLocation(Scanner, Select->FLocation);
+  Select.FFrameIndex = Scanner.FindInteger("level", 0);
+  ParseLocation(Scanner, Select.FLocation);
   return true;
 }
 
-bool DecodeStackInfoFrame(TGDBResult& Result, TMIScanner& Scanner) {
-  auto* Info = As<TStackInfoFrameResult>(Result);
-  if (!Info)
-    return false;
+bool DecodeStackInfoFrame(TStackInfoFrameResult& Info, TMIScanner& Scanner) {
   const std::string_view Frame = Scanner.FindValue("frame");
   if (Frame.empty())
     return false;
   TMIScanner::TNestedScan InFrame(Scanner, Frame);
-  ParseLocation(Scanner, Info->FLocation);
+  ParseLocation(Scanner, Info.FLocation);
   return true;
 }
 
-bool DecodeStackInfoDepth(TGDBResult& Result, TMIScanner& Scanner) {
-  auto* Depth = As<TStackInfoDepthResult>(Result);
-  if (!Depth)
-    return false;
-  Depth->FStackDepth = Scanner.FindInteger("depth", -1);
-  return Depth->FStackDepth != -1;
+bool DecodeStackInfoDepth(TStackInfoDepthResult& Depth, TMIScanner& Scanner) {
+  Depth.FStackDepth = Scanner.FindInteger("depth", -1);
+  return Depth.FStackDepth != -1;
 }
 
-bool DecodeStackListFrames(TGDBResult& Result, TMIScanner& Scanner) {
-  auto* Frames = As<TStackListFramesResult>(Result);
+bool DecodeStackListFrames(TStackListFramesResult& Frames, TMIScanner& Scanner) {
   std::string_view Stack;
-  if (!Frames || !FindResult(Scanner, "stack", Stack))
+  if (!FindResult(Scanner, "stack", Stack))
     return false;
   TMIScanner::TNestedScan InStack(Scanner, Stack);
   for (std::string_view Frame = TakeNext(Scanner, "frame"); !Frame.empty(); Frame = TakeNext(Scanner, "frame")) {
@@ -288,7 +266,7 @@ bool DecodeStackListFrames(TGDBResult& Result, TMIScanner& Scanner) {
     TGDBStackFrame StackFrame;
     ParseLocation(Scanner, StackFrame.Location);
     StackFrame.Header = Text(Scanner.FindValue("func"));
-    PlaceByLevel(Frames->FStackFrames, Level, std::move(StackFrame));
+    PlaceByLevel(Frames.FStackFrames, Level, std::move(StackFrame));
   }
   return true;
 }
@@ -299,10 +277,9 @@ bool HoldsResults(std::string_view ListText) {
   return !ListText.empty() && ListText.front() != '"' && ListText.front() != '{' && ListText.front() != '[';
 }
 
-bool DecodeStackListArguments(TGDBResult& Result, TMIScanner& Scanner) {
-  auto* Arguments = As<TStackListArgumentsResult>(Result);
+bool DecodeStackListArguments(TStackListArgumentsResult& Arguments, TMIScanner& Scanner) {
   std::string_view StackArgs;
-  if (!Arguments || !FindResult(Scanner, "stack-args", StackArgs))
+  if (!FindResult(Scanner, "stack-args", StackArgs))
     return false;
   TMIScanner::TNestedScan InStackArgs(Scanner, StackArgs);
   for (std::string_view Frame = TakeNext(Scanner, "frame"); !Frame.empty(); Frame = TakeNext(Scanner, "frame")) {
@@ -327,83 +304,70 @@ bool DecodeStackListArguments(TGDBResult& Result, TMIScanner& Scanner) {
         FrameArguments.NameValues.push_back({std::move(Name), Text(Scanner.FindValue("value"))});
       });
     }
-    PlaceByLevel(Arguments->FStackArguments, Level, std::move(FrameArguments));
+    PlaceByLevel(Arguments.FStackArguments, Level, std::move(FrameArguments));
   }
   return true;
 }
 
-bool DecodeStackListLocals(TGDBResult& Result, TMIScanner& Scanner) {
-  auto* Locals = As<TStackListLocalsResult>(Result);
-  if (!Locals)
-    return false;
-  Locals->FStackLocals.clear();
+bool DecodeStackListLocals(TStackListLocalsResult& Locals, TMIScanner& Scanner) {
+  Locals.FStackLocals.clear();
   const std::string_view List = Scanner.FindValue("locals");
   if (HoldsResults(List)) {
     TMIScanner::TNestedScan InList(Scanner, List);
     for (std::string_view Name = TakeNext(Scanner, "name"); !Name.empty(); Name = TakeNext(Scanner, "name"))
-      Locals->FStackLocals.push_back(Text(Name));
+      Locals.FStackLocals.push_back(Text(Name));
     return true;
   }
   // With values GDB lists a tuple per local: locals=[{name="i",...},...].
   ForEachElement(Scanner, List, [&](std::string_view Element) {
     if (!Element.empty())
-      Locals->FStackLocals.push_back(Text(Scanner.FindValue("name")));
+      Locals.FStackLocals.push_back(Text(Scanner.FindValue("name")));
   });
   return true;
 }
 
-bool DecodeSymbolListLines(TGDBResult& Result, TMIScanner& Scanner) {
-  auto* Lines = As<TSymbolListLinesResult>(Result);
+bool DecodeSymbolListLines(TSymbolListLinesResult& Lines, TMIScanner& Scanner) {
   std::string_view List;
-  if (!Lines || !FindResult(Scanner, "lines", List))
+  if (!FindResult(Scanner, "lines", List))
     return false;
   ForEachElement(Scanner, List, [&](std::string_view Element) {
     if (Element.empty())
       return;
-    const UInt64 Address = Lines->FIncludeAddress ? Scanner.FindUInt64("pc", 0) : 0;
+    const UInt64 Address = Lines.FIncludeAddress ? Scanner.FindUInt64("pc", 0) : 0;
     const Integer Line = Scanner.FindInteger("line", -1);
     if (Line == -1)
       return;
-    Lines->FLines.push_back(Line);
-    if (Lines->FIncludeAddress)
-      Lines->FAddresses.push_back(Address);
+    Lines.FLines.push_back(Line);
+    if (Lines.FIncludeAddress)
+      Lines.FAddresses.push_back(Address);
   });
   return true;
 }
 
-bool DecodeVarCreate(TGDBResult& Result, TMIScanner& Scanner) {
-  auto* Create = As<TVarCreateResult>(Result);
-  if (!Create)
-    return false;
-  Create->FName = Text(Scanner.FindValue("name"));
-  Create->FNumChild = ReadNumChild(Scanner);
-  Create->FType = Text(Scanner.FindValue("type"));
-  Create->FValue = Text(Scanner.FindValue("value"));
-  if (!Create->FValue.empty())
-    Create->FValueDefined = true;
+bool DecodeVarCreate(TVarCreateResult& Create, TMIScanner& Scanner) {
+  Create.FName = Text(Scanner.FindValue("name"));
+  Create.FNumChild = ReadNumChild(Scanner);
+  Create.FType = Text(Scanner.FindValue("type"));
+  Create.FValue = Text(Scanner.FindValue("value"));
+  if (!Create.FValue.empty())
+    Create.FValueDefined = true;
   return true;
 }
 
-bool DecodeVarInfoNumChildren(TGDBResult& Result, TMIScanner& Scanner) {
-  auto* Info = As<TVarInfoNumChildrenResult>(Result);
-  if (!Info)
-    return false;
-  Info->FCount = ReadNumChild(Scanner);
+bool DecodeVarInfoNumChildren(TVarInfoNumChildrenResult& Info, TMIScanner& Scanner) {
+  Info.FCount = ReadNumChild(Scanner);
   return true;
 }
 
-bool DecodeVarListChildren(TGDBResult& Result, TMIScanner& Scanner) {
-  auto* List = As<TVarListChildrenResult>(Result);
-  if (!List)
-    return false;
+bool DecodeVarListChildren(TVarListChildrenResult& List, TMIScanner& Scanner) {
   const Integer Count = ReadNumChild(Scanner);
   if (Count <= 0)
     return true;
   std::string_view Children;
   const bool Present = FindResult(Scanner, "children", Children);
-  List->FChildren.assign(static_cast<size_t>(Count), TGDBVarChild());
+  List.FChildren.assign(static_cast<size_t>(Count), TGDBVarChild());
   TMIScanner::TNestedScan InChildren(Scanner, Children);
-  for (TGDBVarChild& Child : List->FChildren) {
+  for (TGDBVarChild& Child : List.FChildren) {
     TMIScanner::TNestedScan InChild(Scanner, TakeNext(Scanner, "child"));
     Child.Name = Text(Scanner.FindValue("name"));
     Child.Expr = Text(Scanner.FindValue("exp"));
@@ -413,37 +377,25 @@ bool DecodeVarListChildren(TGDBResult& Result, TMIScanner& Scanner) {
   return Present;
 }
 
-bool DecodeVarInfoPathExpression(TGDBResult& Result, TMIScanner& Scanner) {
-  auto* Path = As<TVarInfoPathExpressionResult>(Result);
-  if (!Path)
-    return false;
-  Path->FExpr = Text(Scanner.FindValue("path_expr"));
+bool DecodeVarInfoPathExpression(TVarInfoPathExpressionResult& Path, TMIScanner& Scanner) {
+  Path.FExpr = Text(Scanner.FindValue("path_expr"));
   return true;
 }
 
-bool DecodeVarShowAttributes(TGDBResult& Result, TMIScanner& Scanner, bool IsLLDB) {
-  auto* Attributes = As<TVarShowAttributesResult>(Result);
-  if (!Attributes)
-    return false;
+bool DecodeVarShowAttributes(TVarShowAttributesResult& Attributes, TMIScanner& Scanner, bool IsLLDB) {
   if (Scanner.FindValue(IsLLDB ? "status" : "attr") == "editable")
-    Attributes->FEditable = true;
+    Attributes.FEditable = true;
   return true;
 }
 
 /// The commands whose whole answer is one "value".
 template <typename TResult>
-bool DecodeValue(TGDBResult& Result, TMIScanner& Scanner) {
-  auto* Typed = As<TResult>(Result);
-  if (!Typed)
-    return false;
-  Typed->FValue = Text(Scanner.FindValue("value"));
+bool DecodeValue(TResult& Typed, TMIScanner& Scanner) {
+  Typed.FValue = Text(Scanner.FindValue("value"));
   return true;
 }
 
-bool DecodeVarUpdate(TGDBResult& Result, TMIScanner& Scanner) {
-  auto* Update = As<TVarUpdateResult>(Result);
-  if (!Update)
-    return false;
+bool DecodeVarUpdate(TVarUpdateResult& Update, TMIScanner& Scanner) {
   const std::string_view List = Scanner.FindValue("changelist");
   if (List.empty())
     return true;
@@ -461,25 +413,21 @@ bool DecodeVarUpdate(TGDBResult& Result, TMIScanner& Scanner) {
     Changes.push_back({std::move(Name), std::move(Value)});
   });
   if (OutOfScope)
-    Update->FOutOfScope = true;
-  Update->FChangeList = std::move(Changes);
+    Update.FOutOfScope = true;
+  Update.FChangeList = std::move(Changes);
   return true;
 }
 
-bool DecodePidInfo(TGDBResult& Result, TMIScanner& Scanner) {
-  auto* Pid = As<TPidInfoResult>(Result);
-  if (!Pid)
-    return false;
-  Pid->FPid = Scanner.FindInteger("process-id", -1);
-  return Pid->FPid != -1;
+bool DecodePidInfo(TPidInfoResult& Pid, TMIScanner& Scanner) {
+  Pid.FPid = Scanner.FindInteger("process-id", -1);
+  return Pid.FPid != -1;
 }
 
-bool DecodeTargetInfoAsync(TGDBResult& Result, TMIScanner& Scanner) {
-  auto* Async = As<TTargetInfoAsyncResult>(Result);
+bool DecodeTargetInfoAsync(TTargetInfoAsyncResult& Async, TMIScanner& Scanner) {
   std::string_view CanAsync;
-  if (!Async || !FindResult(Scanner, "can_async", CanAsync))
+  if (!FindResult(Scanner, "can_async", CanAsync))
     return false;
-  Async->FAsyncTarget = CanAsync == "true";
+  Async.FAsyncTarget = CanAsync == "true";
   return true;
 }
 
@@ -491,16 +439,13 @@ std::string LowerCaseASCII(std::string_view Text) {
   return Lower;
 }
 
-bool DecodeCLInfoLineAddress(TGDBResult& Result, TMIScanner& Scanner) {
-  auto* InfoLine = As<TCLInfoLineAddressResult>(Result);
-  if (!InfoLine)
-    return false;
+bool DecodeCLInfoLineAddress(TCLInfoLineAddressResult& InfoLine, TMIScanner& Scanner) {
   const std::string Text = LowerCaseASCII(Scanner.ReadCString());
-  if (!Text.starts_with(InfoLine->FExpected))
+  if (!Text.starts_with(InfoLine.FExpected))
     return false;
-  std::string_view Address = std::string_view(Text).substr(InfoLine->FExpected.size());
+  std::string_view Address = std::string_view(Text).substr(InfoLine.FExpected.size());
   Address = Address.substr(0, Address.find(' '));
-  InfoLine->FAddress = MIStrToUInt64Def(Address, 0);
+  InfoLine.FAddress = MIStrToUInt64Def(Address, 0);
   return true;
 }
 
@@ -509,67 +454,67 @@ bool DecodeCLInfoLineAddress(TGDBResult& Result, TMIScanner& Scanner) {
 bool DecodeResult(TGDBResult& Result, TMIScanner& Scanner, bool IsLLDB) {
   switch (Result.FCommand) {
   case ctBreakInsert:
-    return DecodeBreakInsert(Result, Scanner);
+    return DecodeAs(Result, Scanner, DecodeBreakInsert);
   case ctBreakWatch:
-    return DecodeBreakWatch(Result, Scanner);
+    return DecodeAs(Result, Scanner, DecodeBreakWatch);
   case ctThreadInfo:
-    return DecodeThreadInfo(Result, Scanner);
+    return DecodeAs(Result, Scanner, DecodeThreadInfo);
   case ctThreadListIds:
-    return DecodeThreadListIds(Result, Scanner);
+    return DecodeAs(Result, Scanner, DecodeThreadListIds);
   case ctThreadSelect:
-    return DecodeThreadSelect(Result, Scanner);
+    return DecodeAs(Result, Scanner, DecodeThreadSelect);
   case ctStackInfoFrame:
-    return DecodeStackInfoFrame(Result, Scanner);
+    return DecodeAs(Result, Scanner, DecodeStackInfoFrame);
   case ctStackInfoDepth:
-    return DecodeStackInfoDepth(Result, Scanner);
+    return DecodeAs(Result, Scanner, DecodeStackInfoDepth);
   case ctStackListFrames:
-    return DecodeStackListFrames(Result, Scanner);
+    return DecodeAs(Result, Scanner, DecodeStackListFrames);
   case ctStackListArguments:
-    return DecodeStackListArguments(Result, Scanner);
+    return DecodeAs(Result, Scanner, DecodeStackListArguments);
   case ctStackListLocals:
-    return DecodeStackListLocals(Result, Scanner);
+    return DecodeAs(Result, Scanner, DecodeStackListLocals);
   case ctSymbolListLines:
-    return DecodeSymbolListLines(Result, Scanner);
+    return DecodeAs(Result, Scanner, DecodeSymbolListLines);
   case ctVarCreate:
-    return DecodeVarCreate(Result, Scanner);
+    return DecodeAs(Result, Scanner, DecodeVarCreate);
   case ctVarInfoNumChildren:
-    return DecodeVarInfoNumChildren(Result, Scanner);
+    return DecodeAs(Result, Scanner, DecodeVarInfoNumChildren);
   case ctVarListChildren:
-    return DecodeVarListChildren(Result, Scanner);
+    return DecodeAs(Result, Scanner, DecodeVarListChildren);
   case ctVarInfoPathExpression:
-    return DecodeVarInfoPathExpression(Result, Scanner);
+    return DecodeAs(Result, Scanner, DecodeVarInfoPathExpression);
   case ctVarShowAttributes:
-    return DecodeVarShowAttributes(Result, Scanner, IsLLDB);
+    return DecodeAs(Result, Scanner, DecodeVarShowAttributes, IsLLDB);
   case ctVarEvaluateExpression:
-    return DecodeValue<TVarEvaluateExpressionResult>(Result, Scanner);
+    return DecodeAs(Result, Scanner, DecodeValue<TVarEvaluateExpressionResult>);
   case ctVarAssign:
-    return DecodeValue<TVarAssignResult>(Result, Scanner);
+    return DecodeAs(Result, Scanner, DecodeValue<TVarAssignResult>);
   case ctDataEvaluateExpression:
-    return DecodeValue<TDataEvaluateExpressionResult>(Result, Scanner);
+    return DecodeAs(Result, Scanner, DecodeValue<TDataEvaluateExpressionResult>);
   case ctGdbShow:
-    return DecodeValue<TGdbShowResult>(Result, Scanner);
+    return DecodeAs(Result, Scanner, DecodeValue<TGdbShowResult>);
   case ctVarUpdate:
-    return DecodeVarUpdate(Result, Scanner);
+    return DecodeAs(Result, Scanner, DecodeVarUpdate);
   case ctDataDisassemble:
-    return decode::DecodeDataDisassemble(Result, Scanner);
+    return DecodeAs(Result, Scanner, decode::DecodeDataDisassemble);
   case ctDataListRegisterNames:
-    return decode::DecodeDataListRegisterNames(Result, Scanner);
+    return DecodeAs(Result, Scanner, decode::DecodeDataListRegisterNames);
   case ctDataListRegisterValues:
-    return decode::DecodeDataListRegisterValues(Result, Scanner);
+    return DecodeAs(Result, Scanner, decode::DecodeDataListRegisterValues);
   case ctDataListXMMRegisterValues:
-    return decode::DecodeDataListXMMRegisterValues(Result, Scanner);
+    return DecodeAs(Result, Scanner, decode::DecodeDataListVectorRegisterValues<TDataListXMMRegisterValuesResult>);
   case ctDataListFPURegisterValues:
-    return decode::DecodeDataListFPURegisterValues(Result, Scanner);
+    return DecodeAs(Result, Scanner, decode::DecodeDataListVectorRegisterValues<TDataListFPURegisterValuesResult>);
   case ctDataReadMemory:
-    return decode::DecodeDataReadMemory(Result, Scanner);
+    return DecodeAs(Result, Scanner, decode::DecodeDataReadMemory);
   case ctDataReadMemoryBytes:
-    return decode::DecodeDataReadMemoryBytes(Result, Scanner);
+    return DecodeAs(Result, Scanner, decode::DecodeDataReadMemoryBytes);
   case ctDataInfoLine:
-    return decode::DecodeDataInfoLine(Result, Scanner);
+    return DecodeAs(Result, Scanner, decode::DecodeDataInfoLine);
   case ctPidInfo:
-    return DecodePidInfo(Result, Scanner);
+    return DecodeAs(Result, Scanner, DecodePidInfo);
   case ctTargetInfoAsync:
-    return DecodeTargetInfoAsync(Result, Scanner);
+    return DecodeAs(Result, Scanner, DecodeTargetInfoAsync);
   case ctExecRun:
   case ctFileExecAndSymbols:
   case ctTargetAttach:
@@ -584,7 +529,7 @@ bool DecodeResult(TGDBResult& Result, TMIScanner& Scanner, bool IsLLDB) {
 bool DecodeConsoleResult(TGDBResult& Result, TMIScanner& Scanner) {
   switch (Result.FCommand) {
   case ctCLInfoLineAddress:
-    return DecodeCLInfoLineAddress(Result, Scanner);
+    return DecodeAs(Result, Scanner, DecodeCLInfoLineAddress);
   case ctCLKill:
   case ctCLMemoryWrite:
     return true;

@@ -12,11 +12,6 @@ namespace midebug::decode {
 
 namespace {
 
-template <typename TResult>
-TResult* As(TGDBResult& Result) {
-  return dynamic_cast<TResult*>(&Result);
-}
-
 // --- Disassembly ------------------------------------------------------------
 
 /// The instruction's length: "size" where the debugger gives it, else the
@@ -305,10 +300,9 @@ TXMMFPURegValue ParseVectorValue(std::string_view Text, const TXMMFPURegValue& D
   return Value;
 }
 
-bool DecodeDataDisassemble(TGDBResult& Result, TMIScanner& Scanner) {
-  auto* Disassembly = As<TDataDisassembleResult>(Result);
+bool DecodeDataDisassemble(TDataDisassembleResult& Disassembly, TMIScanner& Scanner) {
   std::string_view Instructions;
-  if (!Disassembly || !FindResult(Scanner, "asm_insns", Instructions))
+  if (!FindResult(Scanner, "asm_insns", Instructions))
     return false;
   TGDBDisassembleDataArray Data;
   // The form follows the reply: GDB answers a source request for code
@@ -326,62 +320,40 @@ bool DecodeDataDisassemble(TGDBResult& Result, TMIScanner& Scanner) {
       ReadInstructions(Scanner, Scanner.FindValue("line_asm_insn"), Data, Line, std::move(File));
     }
   }
-  Disassembly->FData = std::move(Data);
+  Disassembly.FData = std::move(Data);
   return true;
 }
 
-bool DecodeDataListRegisterNames(TGDBResult& Result, TMIScanner& Scanner) {
-  auto* Names = As<TDataListRegisterNamesResult>(Result);
+bool DecodeDataListRegisterNames(TDataListRegisterNamesResult& Names, TMIScanner& Scanner) {
   std::string_view List;
-  if (!Names || !FindResult(Scanner, "register-names", List))
+  if (!FindResult(Scanner, "register-names", List))
     return false;
-  Names->FNames.clear();
-  if (List.empty())
-    return true;
-  TMIScanner::TNestedScan InList(Scanner, List);
-  while (!Scanner.AtEnd()) {
-    // Empty names keep their place, so that positions stay register numbers.
-    Names->FNames.emplace_back(Scanner.ReadValue());
-    if (Scanner.AtEnd() || Scanner.Char() != ',')
-      break;
-    Scanner.NextChar();
-  }
+  Names.FNames.clear();
+  // Empty names keep their place, so that positions stay register numbers.
+  ForEachElement(Scanner, List, [&](std::string_view Name) { Names.FNames.emplace_back(Name); });
   return true;
 }
 
-bool DecodeDataListRegisterValues(TGDBResult& Result, TMIScanner& Scanner) {
-  auto* Registers = As<TDataListRegisterValuesResult>(Result);
-  if (!Registers)
-    return false;
-  const bool Single = Registers->FIds.empty();
-  const Integer CpsrIndex = Registers->FCpsrIndex;
-  return ReadRegisterValues(Scanner, Registers->FIds, Registers->FId, Registers->FValue, Registers->FValues,
+bool DecodeDataListRegisterValues(TDataListRegisterValuesResult& Registers, TMIScanner& Scanner) {
+  const bool Single = Registers.FIds.empty();
+  const Integer CpsrIndex = Registers.FCpsrIndex;
+  return ReadRegisterValues(Scanner, Registers.FIds, Registers.FId, Registers.FValue, Registers.FValues,
                             [&](std::string_view Text, Integer Position) {
                               const bool FlagsRule = Single ? CpsrIndex != -1 : Position == CpsrIndex;
                               return ReadGeneralRegisterValue(Text, FlagsRule);
                             });
 }
 
-bool DecodeDataListXMMRegisterValues(TGDBResult& Result, TMIScanner& Scanner) {
-  auto* Registers = As<TDataListXMMRegisterValuesResult>(Result);
-  if (!Registers)
-    return false;
-  return ReadRegisterValues(Scanner, Registers->FIds, Registers->FId, Registers->FValue, Registers->FValues,
+template <typename TResult>
+bool DecodeDataListVectorRegisterValues(TResult& Registers, TMIScanner& Scanner) {
+  return ReadRegisterValues(Scanner, Registers.FIds, Registers.FId, Registers.FValue, Registers.FValues,
                             [](std::string_view Text, Integer) { return ParseVectorValue(Text, DummyXMMRegValue); });
 }
 
-bool DecodeDataListFPURegisterValues(TGDBResult& Result, TMIScanner& Scanner) {
-  auto* Registers = As<TDataListFPURegisterValuesResult>(Result);
-  if (!Registers)
-    return false;
-  return ReadRegisterValues(Scanner, Registers->FIds, Registers->FId, Registers->FValue, Registers->FValues,
-                            [](std::string_view Text, Integer) { return ParseVectorValue(Text, DummyFPURegValue); });
-}
+template bool DecodeDataListVectorRegisterValues(TDataListXMMRegisterValuesResult&, TMIScanner&);
+template bool DecodeDataListVectorRegisterValues(TDataListFPURegisterValuesResult&, TMIScanner&);
 
-bool DecodeDataReadMemory(TGDBResult& Result, TMIScanner& Scanner) {
-  auto* Memory = As<TDataReadMemoryResult>(Result);
-  if (!Memory)
-    return false;
+bool DecodeDataReadMemory(TDataReadMemoryResult& Memory, TMIScanner& Scanner) {
   const Integer Count = Scanner.FindInteger("nr-bytes", 0);
   if (Count <= 0)
     return true;
@@ -402,14 +374,13 @@ bool DecodeDataReadMemory(TGDBResult& Result, TMIScanner& Scanner) {
       break;
     Scanner.NextChar();
   }
-  Memory->FData = std::move(Bytes);
+  Memory.FData = std::move(Bytes);
   return true;
 }
 
-bool DecodeDataReadMemoryBytes(TGDBResult& Result, TMIScanner& Scanner) {
-  auto* Memory = As<TDataReadMemoryResult>(Result);
+bool DecodeDataReadMemoryBytes(TDataReadMemoryResult& Memory, TMIScanner& Scanner) {
   std::string_view Blocks;
-  if (!Memory || !FindResult(Scanner, "memory", Blocks))
+  if (!FindResult(Scanner, "memory", Blocks))
     return false;
   TMIScanner::TNestedScan InBlocks(Scanner, Blocks);
   std::string_view Contents;
@@ -421,21 +392,20 @@ bool DecodeDataReadMemoryBytes(TGDBResult& Result, TMIScanner& Scanner) {
     const int Low = HexDigitValue(Contents[2 * Index + 1]);
     Bytes[Index] = High < 0 || Low < 0 ? 0 : static_cast<Byte>(High * 16 + Low);
   }
-  Memory->FData = std::move(Bytes);
+  Memory.FData = std::move(Bytes);
   return true;
 }
 
-bool DecodeDataInfoLine(TGDBResult& Result, TMIScanner& Scanner) {
-  auto* Info = As<TDataInfoLineResult>(Result);
+bool DecodeDataInfoLine(TDataInfoLineResult& Info, TMIScanner& Scanner) {
   std::string_view Start;
   std::string_view End;
-  if (!Info || !FindResult(Scanner, "start", Start) || !FindResult(Scanner, "end", End))
+  if (!FindResult(Scanner, "start", Start) || !FindResult(Scanner, "end", End))
     return false;
-  Info->FStartAddr = MIStrToUInt64Def(Start, 0);
-  Info->FEndAddr = MIStrToUInt64Def(End, 0);
-  Info->FLine = Scanner.FindInteger("line", 0);
-  Info->FSource = std::string(Scanner.FindValue("file"));
-  return Info->FEndAddr != 0 && Info->FLine != -1;
+  Info.FStartAddr = MIStrToUInt64Def(Start, 0);
+  Info.FEndAddr = MIStrToUInt64Def(End, 0);
+  Info.FLine = Scanner.FindInteger("line", 0);
+  Info.FSource = std::string(Scanner.FindValue("file"));
+  return Info.FEndAddr != 0 && Info.FLine != -1;
 }
 
 } // namespace midebug::decode

@@ -7,8 +7,19 @@
 #include "mi/miscanner.h"
 
 #include <string_view>
+#include <type_traits>
 
 namespace midebug::decode {
+
+/// Runs Decode when Result is of the class Decode fills. A result object of
+/// another class answers false, as a reply that cannot be placed: each
+/// decoder then reads its own class only.
+template <typename TResult, typename... TArgs>
+bool DecodeAs(TGDBResult& Result, TMIScanner& Scanner, bool (*Decode)(TResult&, TMIScanner&, TArgs...),
+              std::type_identity_t<TArgs>... Args) {
+  auto* Typed = dynamic_cast<TResult*>(&Result);
+  return Typed != nullptr && Decode(*Typed, Scanner, Args...);
+}
 
 /// True when a result called Name stands among the results at the cursor,
 /// with its value in Value (possibly empty, as in "threads=[]"). The cursor
@@ -46,14 +57,16 @@ void ForEachElement(TMIScanner& Scanner, std::string_view ListText, TVisit&& Vis
 }
 
 /// The decoders of disassembly, registers, memory and line information.
-bool DecodeDataDisassemble(TGDBResult& Result, TMIScanner& Scanner);
-bool DecodeDataListRegisterNames(TGDBResult& Result, TMIScanner& Scanner);
-bool DecodeDataListRegisterValues(TGDBResult& Result, TMIScanner& Scanner);
-bool DecodeDataListXMMRegisterValues(TGDBResult& Result, TMIScanner& Scanner);
-bool DecodeDataListFPURegisterValues(TGDBResult& Result, TMIScanner& Scanner);
-bool DecodeDataReadMemory(TGDBResult& Result, TMIScanner& Scanner);
-bool DecodeDataReadMemoryBytes(TGDBResult& Result, TMIScanner& Scanner);
-bool DecodeDataInfoLine(TGDBResult& Result, TMIScanner& Scanner);
+bool DecodeDataDisassemble(TDataDisassembleResult& Disassembly, TMIScanner& Scanner);
+bool DecodeDataListRegisterNames(TDataListRegisterNamesResult& Names, TMIScanner& Scanner);
+bool DecodeDataListRegisterValues(TDataListRegisterValuesResult& Registers, TMIScanner& Scanner);
+/// TResult is TDataListXMMRegisterValuesResult or
+/// TDataListFPURegisterValuesResult: both read the same 16-byte values.
+template <typename TResult>
+bool DecodeDataListVectorRegisterValues(TResult& Registers, TMIScanner& Scanner);
+bool DecodeDataReadMemory(TDataReadMemoryResult& Memory, TMIScanner& Scanner);
+bool DecodeDataReadMemoryBytes(TDataReadMemoryResult& Memory, TMIScanner& Scanner);
+bool DecodeDataInfoLine(TDataInfoLineResult& Info, TMIScanner& Scanner);
 
 /// Reads an x87 or SSE register value into its 16 bytes, starting from
 /// Default: GDB's nested brace groups ("{..., v16_int8 = {...}, uint128 =

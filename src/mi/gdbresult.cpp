@@ -1,6 +1,7 @@
 #include "mi/gdbresult.h"
 
-#include <algorithm>
+#include "mi/gdbregisters.h"
+
 #include <cstddef>
 #include <utility>
 
@@ -152,18 +153,6 @@ TDataListRegisterValuesResult::TDataListRegisterValuesResult(const TIntegerArray
 TDataListRegisterValuesResult::TDataListRegisterValuesResult(Integer Id, bool HasCpsr)
     : TGDBResult(ctDataListRegisterValues), FId(Id), FCpsrIndex(HasCpsr ? 0 : -1) {}
 
-TDataListXMMRegisterValuesResult::TDataListXMMRegisterValuesResult(const TIntegerArray& Ids)
-    : TGDBResult(ctDataListXMMRegisterValues), FIds(Ids) {}
-
-TDataListXMMRegisterValuesResult::TDataListXMMRegisterValuesResult(Integer Id)
-    : TGDBResult(ctDataListXMMRegisterValues), FId(Id) {}
-
-TDataListFPURegisterValuesResult::TDataListFPURegisterValuesResult(const TIntegerArray& Ids)
-    : TGDBResult(ctDataListFPURegisterValues), FIds(Ids) {}
-
-TDataListFPURegisterValuesResult::TDataListFPURegisterValuesResult(Integer Id)
-    : TGDBResult(ctDataListFPURegisterValues), FId(Id) {}
-
 TDataEvaluateExpressionResult::TDataEvaluateExpressionResult() : TGDBResult(ctDataEvaluateExpression) {}
 
 TGdbShowResult::TGdbShowResult() : TGDBResult(ctGdbShow) {}
@@ -171,124 +160,24 @@ TGdbShowResult::TGdbShowResult() : TGDBResult(ctGdbShow) {}
 // ---------------------------------------------------------------------------
 // TDataListRegisterNamesResult
 
-namespace {
-
-template <std::size_t Count>
-TStringArray TableCopy(const std::array<std::string_view, Count>& Table) {
-  return TStringArray(Table.begin(), Table.end());
-}
-
-/// The other name of the x86-64 flags register. GDB calls it eflags on
-/// every platform, LLDB rflags except on Windows; without the alias the flags
-/// entry would show register 0 (rax) under GDB on Linux.
-std::string_view FlagsRegisterAlias(std::string_view Name) {
-  if (Name == "rflags")
-    return "eflags";
-  if (Name == "eflags")
-    return "rflags";
-  return {};
-}
-
-} // namespace
-
 TDataListRegisterNamesResult::TDataListRegisterNamesResult(TGDBCPU CPU, const std::string& Platform)
     : TGDBResult(ctDataListRegisterNames) {
-  switch (CPU) {
-  case gcIA32:
-    FRegisters = TableCopy(IA32Registers);
+  FRegisters = GeneralRegisterTable(CPU, Platform).Copy();
+  // Only AMD64 has x87 and SSE register views.
+  if (CPU != gcAMD64)
     return;
-  case gcARM32:
-    FRegisters = TableCopy(ARM32Registers);
-    return;
-  case gcARM64:
-    FRegisters = TableCopy(ARM64Registers);
-    return;
-  case gcAMD64:
-    // Only the plain Windows debugger says eflags; "Win64x" targets are
-    // debugged by an LLDB that says rflags.
-    FRegisters = TableCopy(Platform == "Win64" ? winAMD64Registers : AMD64Registers);
-    FFPURegisters = TableCopy(Platform == "OSX64" ? macAMD64FPURegisters : AMD64FPURegisters);
-    FXMMRegisters = TableCopy(AMD64XMMRegisters);
-    return;
-  }
+  FFPURegisters = FPURegisterTable(Platform).Copy();
+  FXMMRegisters = XMMRegisterTable().Copy();
 }
 
-TIntegerArray TDataListRegisterNamesResult::GetRegisterIds() const { return MapToDebuggerIds(FRegisters); }
+TIntegerArray TDataListRegisterNamesResult::GetRegisterIds() const { return MapRegisterIds(FRegisters, FNames); }
 
-TIntegerArray TDataListRegisterNamesResult::GetFPURegisterIds() const { return MapToDebuggerIds(FFPURegisters); }
-
-TIntegerArray TDataListRegisterNamesResult::GetXMMRegisterIds() const { return MapToDebuggerIds(FXMMRegisters); }
-
-TIntegerArray TDataListRegisterNamesResult::MapToDebuggerIds(const TStringArray& Table) const {
-  // Debuggers list the registers mostly in table order with others between
-  // them: try the place after the last match first, then search from the
-  // start for any other order.
-  TIntegerArray Ids(Table.size(), 0);
-  std::size_t Cursor = 0;
-  for (std::size_t Entry = 0; Entry < Table.size(); ++Entry) {
-    if (Cursor < FNames.size() && FNames[Cursor] == Table[Entry]) {
-      Ids[Entry] = static_cast<Integer>(Cursor);
-      ++Cursor;
-      continue;
-    }
-    auto Found = std::find(FNames.begin(), FNames.end(), Table[Entry]);
-    if (Found == FNames.end()) {
-      const std::string_view Alias = FlagsRegisterAlias(Table[Entry]);
-      if (!Alias.empty())
-        Found = std::find(FNames.begin(), FNames.end(), Alias);
-    }
-    if (Found == FNames.end())
-      continue;
-    const auto Position = static_cast<std::size_t>(Found - FNames.begin());
-    Ids[Entry] = static_cast<Integer>(Position);
-    Cursor = Position + 1;
-  }
-  return Ids;
+TIntegerArray TDataListRegisterNamesResult::GetFPURegisterIds() const {
+  return MapRegisterIds(FFPURegisters, FNames);
 }
 
-// ---------------------------------------------------------------------------
-// Register name tables
-
-
-const std::array<std::string_view, 16> IA32Registers = {
-    "eax", "ebx", "ecx", "edx", "esi", "edi", "ebp", "esp",
-    "eip", "eflags", "cs", "ss", "ds", "es", "gs", "fs",
-};
-
-const std::array<std::string_view, 24> AMD64Registers = {
-    "rax", "rbx", "rcx", "rdx", "rsi", "rdi", "r8", "r9", "r10", "r11", "r12", "r13",
-    "r14", "r15", "rbp", "rsp", "rip", "rflags", "cs", "ss", "ds", "es", "gs", "fs",
-};
-
-const std::array<std::string_view, 24> winAMD64Registers = {
-    "rax", "rbx", "rcx", "rdx", "rsi", "rdi", "r8", "r9", "r10", "r11", "r12", "r13",
-    "r14", "r15", "rbp", "rsp", "rip", "eflags", "cs", "ss", "ds", "es", "gs", "fs",
-};
-
-const std::array<std::string_view, 17> ARM32Registers = {
-    "r0", "r1", "r2", "r3", "r4", "r5", "r6", "r7", "r8",
-    "r9", "r10", "r11", "r12", "sp", "lr", "pc", "cpsr",
-};
-
-const std::array<std::string_view, 34> ARM64Registers = {
-    "x0",  "x1",  "x2",  "x3",  "x4",  "x5",  "x6",  "x7",  "x8",  "x9",  "x10", "x11",
-    "x12", "x13", "x14", "x15", "x16", "x17", "x18", "x19", "x20", "x21", "x22", "x23",
-    "x24", "x25", "x26", "x27", "x28", "fp",  "lr",  "sp",  "pc",  "cpsr",
-};
-
-const std::array<std::string_view, 16> AMD64FPURegisters = {
-    "st0",   "st1",   "st2",   "st3",   "st4",   "st5",   "st6",   "st7",
-    "fctrl", "fstat", "ftag",  "fiseg", "fioff", "foseg", "fooff", "fop",
-};
-
-const std::array<std::string_view, 16> macAMD64FPURegisters = {
-    "stmm0", "stmm1", "stmm2", "stmm3", "stmm4", "stmm5", "stmm6", "stmm7",
-    "fctrl", "fstat", "ftag",  "fiseg", "fioff", "foseg", "fooff", "fop",
-};
-
-const std::array<std::string_view, 17> AMD64XMMRegisters = {
-    "xmm0", "xmm1", "xmm2",  "xmm3",  "xmm4",  "xmm5",  "xmm6",  "xmm7",  "xmm8",
-    "xmm9", "xmm10", "xmm11", "xmm12", "xmm13", "xmm14", "xmm15", "mxcsr",
-};
+TIntegerArray TDataListRegisterNamesResult::GetXMMRegisterIds() const {
+  return MapRegisterIds(FXMMRegisters, FNames);
+}
 
 } // namespace midebug

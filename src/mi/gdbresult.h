@@ -1,14 +1,12 @@
 #pragma once
 /// \file
 /// What the debugger's replies are decoded into: the plain records shared by
-/// results, events and the process layer, the result objects that carry one
-/// synchronous request each, and the fixed register name tables of the
-/// register views.
+/// results, events and the process layer, and the result objects that carry
+/// one synchronous request each.
 
 #include "mi/gdbcommand.h"
 #include "platform/types.h"
 
-#include <array>
 #include <atomic>
 #include <chrono>
 #include <condition_variable>
@@ -111,7 +109,8 @@ inline const TGDBModule DummyModule = [] {
   return Module;
 }();
 inline const TXMMFPURegValue DummyXMMRegValue{};
-inline const TXMMFPURegValue DummyFPURegValue{};
+/// x87 and SSE registers read as the same 16 zero bytes.
+inline const TXMMFPURegValue& DummyFPURegValue = DummyXMMRegValue;
 
 // ---------------------------------------------------------------------------
 // Result objects
@@ -409,24 +408,28 @@ public:
   Integer FCpsrIndex;
 };
 
-class TDataListXMMRegisterValuesResult : public TGDBResult {
+/// x87 or SSE register values, 16 bytes each, asked for by a list of ids or
+/// one id. The two differ only in their command, by which the reply decoder
+/// knows what it is filling.
+template <TMiCommand Command>
+class TDataListVectorRegisterValuesResult : public TGDBResult {
 public:
-  explicit TDataListXMMRegisterValuesResult(const TIntegerArray& Ids);
-  explicit TDataListXMMRegisterValuesResult(Integer Id);
-  TXMMRegValueArray FValues;
+  explicit TDataListVectorRegisterValuesResult(const TIntegerArray& Ids) : TGDBResult(Command), FIds(Ids) {}
+  explicit TDataListVectorRegisterValuesResult(Integer Id) : TGDBResult(Command), FId(Id) {}
+  std::vector<TXMMFPURegValue> FValues;
   TIntegerArray FIds;
   Integer FId = 0;
   TXMMFPURegValue FValue{};
 };
 
-class TDataListFPURegisterValuesResult : public TGDBResult {
+class TDataListXMMRegisterValuesResult : public TDataListVectorRegisterValuesResult<ctDataListXMMRegisterValues> {
 public:
-  explicit TDataListFPURegisterValuesResult(const TIntegerArray& Ids);
-  explicit TDataListFPURegisterValuesResult(Integer Id);
-  TFPURegValueArray FValues;
-  TIntegerArray FIds;
-  Integer FId = 0;
-  TXMMFPURegValue FValue{};
+  using TDataListVectorRegisterValuesResult::TDataListVectorRegisterValuesResult;
+};
+
+class TDataListFPURegisterValuesResult : public TDataListVectorRegisterValuesResult<ctDataListFPURegisterValues> {
+public:
+  using TDataListVectorRegisterValuesResult::TDataListVectorRegisterValuesResult;
 };
 
 /// The register tables shown for a CPU and platform, and the debugger's own
@@ -448,9 +451,6 @@ public:
   /// The debugger's names in its numbering; empty names keep their place so
   /// that positions equal register numbers.
   TStringArray FNames;
-
-private:
-  TIntegerArray MapToDebuggerIds(const TStringArray& Table) const;
 };
 
 class TDataEvaluateExpressionResult : public TGDBResult {
@@ -464,22 +464,5 @@ public:
   TGdbShowResult();
   std::string FValue;
 };
-
-// ---------------------------------------------------------------------------
-// Register name tables. The register views show these registers, in this
-// order; a register-write command names a register by its position here. The
-// names are compared with the debugger's own register names exactly.
-
-extern const std::array<std::string_view, 16> IA32Registers;
-extern const std::array<std::string_view, 24> AMD64Registers;
-/// As AMD64Registers, but Windows debuggers call the flags register eflags.
-extern const std::array<std::string_view, 24> winAMD64Registers;
-extern const std::array<std::string_view, 17> ARM32Registers;
-extern const std::array<std::string_view, 34> ARM64Registers;
-extern const std::array<std::string_view, 16> AMD64FPURegisters;
-/// As AMD64FPURegisters, but the macOS debugger calls the x87 stack stmm0 to
-/// stmm7.
-extern const std::array<std::string_view, 16> macAMD64FPURegisters;
-extern const std::array<std::string_view, 17> AMD64XMMRegisters;
 
 } // namespace midebug

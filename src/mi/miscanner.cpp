@@ -90,16 +90,6 @@ bool IsGluedResultRecord(std::string_view Text, size_t Caret) {
 
 } // namespace
 
-int HexDigitValue(char Digit) {
-  if (IsDigit(Digit))
-    return Digit - '0';
-  if (Digit >= 'a' && Digit <= 'f')
-    return Digit - 'a' + 10;
-  if (Digit >= 'A' && Digit <= 'F')
-    return Digit - 'A' + 10;
-  return -1;
-}
-
 std::string_view TrimBlanks(std::string_view Text) {
   while (!Text.empty() && IsBlank(Text.front()))
     Text.remove_prefix(1);
@@ -342,69 +332,48 @@ void TMIScanner::SkipResult() {
   SkipValue();
 }
 
-std::string_view TMIScanner::ScanTuple() {
-  if (AtEnd() || Char() != '{')
-    return {};
-  const size_t Start = FPos + 1;
-  if (NextChar() == '}' && !AtEnd()) {
-    NextChar();
-    return {};
-  }
-  SkipResult();
-  while (!AtEnd() && Char() == ',') {
-    NextChar();
-    SkipResult();
-  }
-  if (AtEnd() || Char() != '}')
-    return {};
-  NextChar();
-  return FText.substr(Start, FPos - 1 - Start);
-}
-
-std::string_view TMIScanner::ReadTuple() {
-  const int Saved = FDepth;
-  ++FDepth;
-  const std::string_view Value = FDepth > MaxNesting ? std::string_view() : ScanTuple();
-  FDepth = Saved;
-  return Value;
-}
-
-std::string_view TMIScanner::ScanList() {
-  if (AtEnd() || Char() != '[')
+std::string_view TMIScanner::ScanContainer(char Open, char Close) {
+  if (AtEnd() || Char() != Open)
     return {};
   const size_t Start = FPos + 1;
   NextChar();
   if (AtEnd())
     return {};
-  if (Char() == ']') {
+  if (Char() == Close) {
     NextChar();
     return {};
   }
-  const bool HoldsValues = Char() == '"' || Char() == '{' || Char() == '[';
-  if (HoldsValues)
-    SkipValue();
-  else
-    SkipResult();
-  while (!AtEnd() && Char() == ',') {
-    NextChar();
+  // A tuple holds results; a list holds results or values, as its first
+  // element shows.
+  const bool HoldsValues = Open == '[' && (Char() == '"' || Char() == '{' || Char() == '[');
+  auto SkipElement = [&] {
     if (HoldsValues)
       SkipValue();
     else
       SkipResult();
+  };
+  SkipElement();
+  while (!AtEnd() && Char() == ',') {
+    NextChar();
+    SkipElement();
   }
-  if (AtEnd() || Char() != ']')
+  if (AtEnd() || Char() != Close)
     return {};
   NextChar();
   return FText.substr(Start, FPos - 1 - Start);
 }
 
-std::string_view TMIScanner::ReadList() {
+std::string_view TMIScanner::ReadContainer(char Open, char Close) {
   const int Saved = FDepth;
   ++FDepth;
-  const std::string_view Value = FDepth > MaxNesting ? std::string_view() : ScanList();
+  const std::string_view Value = FDepth > MaxNesting ? std::string_view() : ScanContainer(Open, Close);
   FDepth = Saved;
   return Value;
 }
+
+std::string_view TMIScanner::ReadTuple() { return ReadContainer('{', '}'); }
+
+std::string_view TMIScanner::ReadList() { return ReadContainer('[', ']'); }
 
 std::string_view TMIScanner::ScanValue(bool Keep) {
   if (AtEnd())

@@ -9,6 +9,7 @@
 /// its own lifetime), so every view stays valid while the scanner lives and
 /// the block it was made on is not changed.
 
+#include "platform/hexdigits.h"
 #include "platform/types.h"
 
 #include <cstddef>
@@ -26,8 +27,6 @@ Integer MIStrToIntDef(std::string_view Text, Integer Default);
 /// As MIStrToIntDef for 64-bit values: up to 16 hexadecimal digits yield the
 /// full 64-bit pattern; a negative decimal number yields its two's complement.
 UInt64 MIStrToUInt64Def(std::string_view Text, UInt64 Default);
-/// The value of one hexadecimal digit of either case, or -1.
-int HexDigitValue(char Digit);
 /// Text without the blanks and tabs around it.
 std::string_view TrimBlanks(std::string_view Text);
 
@@ -128,8 +127,11 @@ public:
 private:
   std::string_view ScanCString(bool Keep);
   std::string_view ScanDelimited(char Open, char Close);
-  std::string_view ScanTuple();
-  std::string_view ScanList();
+  /// The inner text of the tuple ("{", "}") or list ("[", "]") at the
+  /// cursor, or empty when it is not closed.
+  std::string_view ScanContainer(char Open, char Close);
+  /// ScanContainer, or empty beyond MaxNesting levels.
+  std::string_view ReadContainer(char Open, char Close);
   std::string_view ScanValue(bool Keep);
   void SkipValue() { ScanValue(false); }
   bool IsPromptLine(std::string_view Line, std::string_view EndOfLineMarker) const;

@@ -4,6 +4,7 @@
 /// of one reference and the objects that implement interfaces. Every
 /// interface that crosses the library's boundary is built on these.
 
+#include "platform/hexdigits.h"
 #include "platform/types.h"
 
 #include <array>
@@ -37,22 +38,12 @@ struct TGUID {
 
 namespace guiddetail {
 
-constexpr int HexDigit(char C) {
-  if (C >= '0' && C <= '9')
-    return C - '0';
-  if (C >= 'a' && C <= 'f')
-    return C - 'a' + 10;
-  if (C >= 'A' && C <= 'F')
-    return C - 'A' + 10;
-  return -1;
-}
-
 /// The value of Count hexadecimal digits at Pos, or -1 when one is not a
 /// digit.
 constexpr int64_t HexValue(std::string_view Text, std::size_t Pos, std::size_t Count) {
   int64_t Value = 0;
   for (std::size_t Index = Pos; Index < Pos + Count; ++Index) {
-    int Digit = HexDigit(Text[Index]);
+    const int Digit = HexDigitValue(Text[Index]);
     if (Digit < 0)
       return -1;
     Value = Value * 16 + Digit;
