@@ -101,8 +101,8 @@ Integer ReadExitCode(std::string_view Text, Integer Default) {
   return Code > 0x7fffffff ? Default : static_cast<Integer>(Code);
 }
 
-void ProcessGDBOutput(const std::string& Line, IGDBInternalProcess& Process) {
-  TGDBOutputParser Parser(Line, Process);
+void ProcessGDBOutput(const std::string& ReplyBlock, IGDBInternalProcess& Process) {
+  TGDBOutputParser Parser(ReplyBlock, Process);
   Parser.Run();
 }
 

@@ -17,7 +17,7 @@ namespace midebug {
 /// Parses one reply block: everything the debugger printed up to (without)
 /// its prompt, lines ending in LF or CR LF. Takes any bytes; never throws for
 /// malformed input, which reads as empty values and defaults.
-void ProcessGDBOutput(const std::string& Line, IGDBInternalProcess& Process);
+void ProcessGDBOutput(const std::string& ReplyBlock, IGDBInternalProcess& Process);
 
 // --- Result payloads (the per-command decoders live in gdbdecode.cpp) -------
 
