@@ -245,16 +245,6 @@ TEST(CommandBuilderSafety, GdbLoadsProgramAndChangesToDirectoryWithBlankQuoteAnd
   EXPECT_NE(Output.find("cwd=\"" + Scratch.Path() + "/a b\\\"c\\\\d\""), std::string::npos) << Output;
 }
 
-TEST(CommandBuilderTokens, ThousandthRequestIsALaunchToken) {
-  TGDBCommand Builder(gcAMD64);
-  std::string Token;
-  for (int Request = 1; Request < 1000; ++Request)
-    Builder.CreateExecNextCommand(Token);
-  EXPECT_EQ(Builder.CreateExecRunCommand(Token, false), "0250000001000-exec-run");
-  EXPECT_EQ(Token, "0250000001000");
-  EXPECT_TRUE(IsProcessLaunchCommand(Token));
-}
-
 TEST(CommandBuilderTokens, CounterWrapsAt32Bits) {
   TGDBCommand Builder(gcIA32);
   Builder.FRequestId = 0xFFFFFFFF;

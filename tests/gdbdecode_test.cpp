@@ -127,17 +127,6 @@ TEST(DecoderThreads, ThreadInfoStateOnlySkipsNamesAndBadIds) {
   EXPECT_FALSE(Decode(Missing, R"(4^done,current-thread-id="1")"));
 }
 
-TEST(DecoderThreads, ThreadListIds) {
-  TThreadListIdsResult WithStates;
-  ASSERT_TRUE(Decode(WithStates, R"(3^done,thread-ids={thread-id="7",thread-id="9"},)"
-                                 R"(threads={thread={thread-id="9",state="stopped",unique-id="u9"},)"
-                                 R"(thread={thread-id="7",state="running",unique-id="u7"}},number-of-threads="2")"));
-  EXPECT_EQ(WithStates.FIds, (TIntegerArray{7, 9}));
-  EXPECT_EQ(WithStates.FStates, (TStringArray{"running", "stopped"}));
-  EXPECT_EQ(WithStates.FNames, (TStringArray{"u7", "u9"}));
-  EXPECT_TRUE(WithStates.FOsIds.empty());
-}
-
 TEST(DecoderThreads, ThreadCountFromTheReplyIsBounded) {
   TThreadListIdsResult Result;
   ASSERT_TRUE(Decode(Result, R"(3^done,thread-ids={thread-id="1"},number-of-threads="2147483647")"));
@@ -277,14 +266,6 @@ TEST(DecoderVariables, UpdateStopsAtTheFirstElementOutOfScope) {
   Empty.FChangeList = {{"kept", "1"}};
   ASSERT_TRUE(Decode(Empty, RecordedReply("prog-gdb13.txt", "37")));
   EXPECT_EQ(Empty.FChangeList.size(), 1u) << "an empty change list leaves the old one";
-}
-
-TEST(DecoderVariables, EditableAttributeByDebugger) {
-  TVarShowAttributesResult LLDB;
-  ASSERT_TRUE(Decode(LLDB, R"(3^done,attr="editable")", true));
-  EXPECT_FALSE(LLDB.FEditable) << "LLDB answers with status";
-  ASSERT_TRUE(Decode(LLDB, R"(3^done,status="editable")", true));
-  EXPECT_TRUE(LLDB.FEditable);
 }
 
 // --- Registers --------------------------------------------------------------------
@@ -445,23 +426,6 @@ TEST(DecoderDisassembly, SizesAndSourceLinesWhereTheReplyHasThem) {
 }
 
 // --- Other answers ----------------------------------------------------------------
-
-TEST(DecoderOther, ProcessAndTargetAnswers) {
-  TPidInfoResult Pid;
-  EXPECT_TRUE(Decode(Pid, R"(3^done,process-id="4242")"));
-  EXPECT_EQ(Pid.FPid, 4242);
-  TPidInfoResult NoPid;
-  EXPECT_FALSE(Decode(NoPid, R"(3^done,pid="4242")"));
-
-  TTargetInfoAsyncResult Async;
-  EXPECT_TRUE(Decode(Async, R"(3^done,can_async="true")"));
-  EXPECT_TRUE(Async.FAsyncTarget);
-  TTargetInfoAsyncResult Sync;
-  EXPECT_TRUE(Decode(Sync, R"(3^done,can_async="false")"));
-  EXPECT_FALSE(Sync.FAsyncTarget);
-  TTargetInfoAsyncResult Unknown;
-  EXPECT_FALSE(Decode(Unknown, R"(3^done,other="true")"));
-}
 
 TEST(DecoderOther, ResultOfAnotherClassThanItsCommandIsNotFilled) {
   // The decoder is chosen by the command, the fields by the class: a result

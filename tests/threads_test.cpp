@@ -20,15 +20,6 @@ namespace {
 
 using test::TTestListener;
 
-TEST(ThreadsState, StrToStateIgnoresLetterCaseAndGivesNoneForAnythingElse) {
-  const std::pair<std::string, TThreadState> Cases[] = {
-      {"Stopped", tsStop}, {"RUNNING", tsRunnable}, {"Waiting", tsBlocked}, {"@@zombie", tsZombie},
-      {"", tsNone},        {"stopped ", tsNone},    {"zombie", tsNone},     {"exited", tsNone},
-  };
-  for (const auto& [Text, State] : Cases)
-    EXPECT_EQ(TGDBThread::StrToState(Text), State) << "'" << Text << "'";
-}
-
 /// Whether Text matches Pattern, where each '*' stands for any run of
 /// characters.
 bool Glob(std::string_view Text, std::string_view Pattern) {
