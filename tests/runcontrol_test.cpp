@@ -250,6 +250,19 @@ TEST_F(RunControl, SignalTheIdeKeepsIsAStopThatResumes) {
   EXPECT_TRUE(Listener->HasCall("Exited(5,"));
 }
 
+TEST_F(RunControl, SignalsTheProgramRaisesItselfAreSignalsNotPauses) {
+  Launch(Debuggee("raised"));
+  Process->Run();
+  for (const char* Signal : {"Signal(1,SIGTRAP)", "Signal(1,SIGINT)"}) {
+    ASSERT_TRUE(NextStop()) << Signal;
+    EXPECT_TRUE(Listener->HasCall(Signal));
+    EXPECT_EQ(StopReason(), tsrSignal) << Signal;
+    Process->Resume();
+  }
+  ASSERT_TRUE(Listener->PumpUntilCall("Exited("));
+  EXPECT_TRUE(Listener->HasCall("Exited(4,"));
+}
+
 TEST_F(RunControl, LoadedAndUnloadedModulesReachTheListenerAndSetTheBaseAddress) {
   TIntfPtr<TModuleListener> Modules(new TModuleListener);
   Listener = Modules;

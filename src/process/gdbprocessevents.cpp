@@ -107,13 +107,21 @@ void TGDBProcess::NotifyProcessSuspended(const TGDBLocation& Location, Integer T
 }
 
 void TGDBProcess::NotifySignalReceived(const TGDBException& SignalException, Integer ThreadId) {
-  const bool Expected = SignalException.Name == "SIGINT" || SignalException.Name == "SIGSTOP" ||
-                        SignalException.Name == "SIGTRAP";
+  // SIGINT, SIGSTOP and SIGTRAP are how a pause the process asked for
+  // arrives; a program that raises them itself gets them reported as
+  // signals. Before the program's first stop only the debugger's own SIGSTOP
+  // (attaching) is expected.
+  const std::string& Name = SignalException.Name;
+  const bool Expected =
+      (FSuspending && (Name == "SIGINT" || Name == "SIGSTOP" || Name == "SIGTRAP")) ||
+      (!FStoppedAtEntryPoint && Name == "SIGSTOP");
   NotifyInterruption(SignalException, ThreadId, Expected, tsrSignal);
 }
 
 void TGDBProcess::NotifyExceptionRaised(const TGDBException& LanguageException, Integer ThreadId) {
-  NotifyInterruption(LanguageException, ThreadId, LanguageException.Name == "0x80000003", tsrExceptRaised);
+  // The breakpoint exception is how a pause arrives on Windows.
+  const bool Expected = (FSuspending || !FStoppedAtEntryPoint) && LanguageException.Name == "0x80000003";
+  NotifyInterruption(LanguageException, ThreadId, Expected, tsrExceptRaised);
 }
 
 void TGDBProcess::NotifyInterruption(const TGDBException& Event, Integer ThreadId, bool Expected,
@@ -121,7 +129,7 @@ void TGDBProcess::NotifyInterruption(const TGDBException& Event, Integer ThreadI
   FSuspended = true;
   // A pause the process asked for, or the debugger's own stop before the
   // program reached its entry point, is a stop like a finished step.
-  if ((FSuspending || !FStoppedAtEntryPoint) && Expected) {
+  if (Expected) {
     FSuspending = false;
     if (FInternalPause)
       YieldAndSleep(WaitPolicy().PollMs);
