@@ -9,3 +9,4 @@
 #include "platform/mainthread.h"
 #include "process/gdbinterfaces.h"
 #include "process/gdbprocessmanager.h"
+#include "process/programarguments.h"

@@ -77,6 +77,33 @@ std::string QuoteCString(std::string_view Text) {
   return Quoted;
 }
 
+/// Text as an MI c-string whose escapes GDB decodes: line breaks and tabs
+/// travel as \n, \r and \t instead of ending the command line.
+std::string EscapeCString(std::string_view Text) {
+  std::string Quoted = "\"";
+  for (const char Character : Text) {
+    switch (Character) {
+    case '\\':
+    case '"':
+      Quoted += '\\';
+      Quoted += Character;
+      break;
+    case '\n':
+      Quoted += "\\n";
+      break;
+    case '\r':
+      Quoted += "\\r";
+      break;
+    case '\t':
+      Quoted += "\\t";
+      break;
+    default:
+      Quoted += Character;
+    }
+  }
+  return Quoted + '"';
+}
+
 std::string DoubleBackslashes(std::string_view Text) {
   std::string Doubled;
   for (const char Character : Text) {
@@ -267,6 +294,10 @@ std::string TGDBCommand::CreateExecArgumentsCommand(std::string& Token, const st
   for (const std::string& Arg : Args)
     Arguments += " " + (Escape ? DoubleBackslashes(Arg) : Arg);
   return MiLine(Token, ctExecArguments, Arguments);
+}
+
+std::string TGDBCommand::CreateSetArgsCommand(std::string& Token, const std::string& Args) {
+  return MiLine(Token, ctInterpreterExec, " console " + EscapeCString("set args " + Args));
 }
 
 std::string TGDBCommand::CreateEnvCdCommand(std::string& Token, const std::string& Dir) {

@@ -148,6 +148,9 @@ public:
   std::string CreateExecArgumentsCommand(std::string& Token, const std::string& Args, bool Escape);
   std::string CreateExecArgumentsCommand(std::string& Token, const std::vector<std::string>& Args,
                                          bool Escape);
+  /// GDB's console "set args", sent as an MI c-string: unlike
+  /// "-exec-arguments" it carries line breaks (an argument may hold one).
+  std::string CreateSetArgsCommand(std::string& Token, const std::string& Args);
   /// The directory goes in double quotes, escaped as an MI c-string.
   std::string CreateEnvCdCommand(std::string& Token, const std::string& Dir);
   std::string CreateEnvDirCommand(std::string& Token, const std::vector<std::string>& Dirs, bool Reset);

@@ -173,10 +173,14 @@ TIntfPtr<IGDBProcess> TGDBProcess::CreateProcess(const std::string& ExeName, con
     throw ENonAIRException(FormatText("Unable to create process: '%s'", {Reason}));
   }
   TIntfPtr<IGDBProcess> Result(static_cast<IGDBProcess*>(this));
-  if (!Arguments.empty())
+  // GDB's "set args" keeps a line break inside an argument; LLDB's front end
+  // knows only "-exec-arguments".
+  if (!Arguments.empty() && FKernel->IsLLDB())
     FRequests.Fire([&Arguments](TGDBCommand& Builder, std::string& Token) {
       return Builder.CreateExecArgumentsCommand(Token, Arguments, false);
     });
+  else if (!Arguments.empty())
+    FRequests.Fire(&TGDBCommand::CreateSetArgsCommand, Arguments);
   std::string Dir = WorkingDir;
   while (Dir.size() > 1 && Dir.back() == PathDelimiter)
     Dir.pop_back();
