@@ -180,7 +180,7 @@ TEST(CommandBuilderSafety, NoBuilderReturnsALineBreak) {
   const std::vector<TBuild> Builders = {
       BUILD(CreateBreakInsertCommand(T, Evil, false, false)), BUILD(CreateBreakInsertCommand(T, Evil, 1, false)),
       BUILD(CreateBreakWatchCommand(T, Evil, true, false)), BUILD(CreateExecArgumentsCommand(T, Evil, true)),
-      BUILD(CreateExecArgumentsCommand(T, TStringArray{Evil}, false)), BUILD(CreateEnvCdCommand(T, Evil)),
+      BUILD(CreateExecArgumentsCommand(T, TStringArray{Evil}, false)), BUILD(CreateEnvCdCommand(T, Evil)), BUILD(CreateInferiorTtySetCommand(T, Evil)),
       BUILD(CreateEnvDirCommand(T, {Evil}, false)), BUILD(CreateEnvPathCommand(T, {Evil}, true)),
       BUILD(CreateExecUntilCommand(T, Evil, 1)), BUILD(CreateVarCreateCommand(T, Evil, Evil, UInt64{0})),
       BUILD(CreateVarListChildrenCommand(T, Evil, true, true, pvfNoValues)),

@@ -274,9 +274,9 @@ TEST(ParserNotify, ThreadAndGroupRecords) {
       {R"(=thread-group-added,id="i1")", {}},
       {R"(=thread-group-created,id="i1")", {}},
       {R"(=thread-group-exited,id="i1",exit-code="010")", {}},
-      {R"(=cmd-param-changed,param="print pretty",value="on")",
-       {LogUnknown(R"(=cmd-param-changed,param="print pretty",value="on")"
-                   "\n")}},
+      {R"(=cmd-param-changed,param="args",value="a b")", {}},
+      {R"(=tsv-created,name="trace",initial="0")", {LogUnknown(R"(=tsv-created,name="trace",initial="0")"
+                                                               "\n")}},
       {"=dyld-load-address-was-not-resolved", {"Restart"}},
       {"=thread-created", {}},
   };

@@ -58,6 +58,19 @@ TEST(PlatformText, IsValidUTF8StopsAtTheEndOfAViewCutInsideASequence) {
   }
 }
 
+TEST(PlatformText, CompleteUTF8LengthHoldsBackOnlyASequenceTheEndCutsShort) {
+  const std::string Whole = "x\xC3\xA9 x\xE2\x82\xAC x\xF0\x9F\x98\x80";
+  for (size_t Length = 0; Length <= Whole.size(); ++Length) {
+    const std::string_view Prefix = std::string_view(Whole).substr(0, Length);
+    const bool EndsInsideSequence = Length < Whole.size() && (static_cast<unsigned char>(Whole[Length]) & 0xC0) == 0x80;
+    const size_t Complete = CompleteUTF8Length(Prefix);
+    EXPECT_EQ(Complete == Length, !EndsInsideSequence) << "first " << Length << " bytes";
+    EXPECT_TRUE(IsValidUTF8(Prefix.substr(0, Complete))) << "first " << Length << " bytes";
+  }
+  // A stray continuation byte completes nothing later: it is not held.
+  EXPECT_EQ(CompleteUTF8Length("a\x80"), 2u);
+}
+
 // --- Command lines ---------------------------------------------------------
 
 TEST(PlatformCommandLine, SplitCommandLineHonoursBlanksQuotesAndEscapes) {

@@ -54,6 +54,7 @@ bool TGDBProcess::NotifyBreakpointOccurred(Integer Breakpoint, const TGDBLocatio
   const TIntfPtr<IGDBBreakpointListener> Listener = FBreakpoints->Find(Breakpoint);
   if (!Listener)
     return false;
+  FTerminal.Drain(false);
   DeferIfLive([this, Listener, Location, ThreadId] {
     EnsureThreadCreated(ThreadId);
     SetCurrentSuspendedThread(ThreadId, Location);

@@ -319,6 +319,10 @@ std::string TGDBCommand::CreateEnvPathCommand(std::string& Token, const std::vec
   return MiLine(Token, ctEnvironmentPath, Arguments);
 }
 
+std::string TGDBCommand::CreateInferiorTtySetCommand(std::string& Token, const std::string& TtyPath) {
+  return MiLine(Token, ctInferiorTtySet, " " + QuoteCString(TtyPath));
+}
+
 std::string TGDBCommand::CreateThreadInfoCommand(std::string& Token, Integer ThreadId) {
   return MiLine(Token, ctThreadInfo, ThreadId == -1 ? "" : " " + std::to_string(ThreadId));
 }

@@ -155,6 +155,9 @@ public:
   std::string CreateEnvCdCommand(std::string& Token, const std::string& Dir);
   std::string CreateEnvDirCommand(std::string& Token, const std::vector<std::string>& Dirs, bool Reset);
   std::string CreateEnvPathCommand(std::string& Token, const std::vector<std::string>& Paths, bool Reset);
+  /// The program's terminal for its next run: a device path, in double
+  /// quotes, escaped as an MI c-string.
+  std::string CreateInferiorTtySetCommand(std::string& Token, const std::string& TtyPath);
   /// ThreadId -1 asks for every thread.
   std::string CreateThreadInfoCommand(std::string& Token, Integer ThreadId);
   std::string CreateThreadListIdsCommand(std::string& Token);

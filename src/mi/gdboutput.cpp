@@ -441,8 +441,10 @@ bool TGDBOutputParser::ProcessNotifyRecord() {
         FProcess.NotifyThreadSelected(Id);
     }
   } else if (Class == "shlib-state-modified" || Class == "dyld-load-address-was-resolved" ||
-             Class == "breakpoint-created" || Class == "thread-group-added" || Class == "thread-group-exited") {
-    // Nothing the process tracks.
+             Class == "breakpoint-created" || Class == "thread-group-added" || Class == "thread-group-exited" ||
+             Class == "cmd-param-changed") {
+    // Nothing the process tracks; a changed setting is the echo of one the
+    // process made itself ("set args").
   } else {
     const std::string Rest(FScanner.ReadRestOfLine(FEndOfLineMarker));
     if (Rest == "\n" || (FIsLLDB && Rest.starts_with("==")))

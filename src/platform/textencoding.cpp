@@ -78,6 +78,20 @@ std::string AnsiToUTF8(std::string_view Bytes) {
   return Text;
 }
 
+size_t CompleteUTF8Length(std::string_view Bytes) {
+  // A sequence is at most 4 bytes: its lead byte is among the last 3 when
+  // the end cuts it short.
+  constexpr size_t MaxTailBytes = 3;
+  for (size_t Back = 1; Back <= MaxTailBytes && Back <= Bytes.size(); ++Back) {
+    const auto Byte = static_cast<unsigned char>(Bytes[Bytes.size() - Back]);
+    if ((Byte & 0xC0) == 0x80)
+      continue;
+    const size_t Length = Byte >= 0xF0 ? 4 : Byte >= 0xE0 ? 3 : Byte >= 0xC0 ? 2 : 1;
+    return Length > Back ? Bytes.size() - Back : Bytes.size();
+  }
+  return Bytes.size();
+}
+
 std::string DecodeUTF8OrAnsi(std::string_view Bytes) {
   return IsValidUTF8(Bytes) ? std::string(Bytes) : AnsiToUTF8(Bytes);
 }

@@ -12,6 +12,9 @@ namespace midebug {
 /// code points above U+10FFFF).
 bool IsValidUTF8(std::string_view Bytes);
 
+/// The length of Bytes without a multi-byte sequence that its end cuts
+/// short, so that text read in pieces is decoded whole.
+size_t CompleteUTF8Length(std::string_view Bytes);
 /// Windows-1252 bytes converted to UTF-8. The five bytes the code page leaves
 /// undefined map to the C1 control of the same value, so no byte is lost.
 std::string AnsiToUTF8(std::string_view Bytes);

@@ -1,6 +1,7 @@
 #include "process/gdbprocess.h"
 
 #include "kernel/gdbremotekernel.h"
+#include "kernel/ideservices.h"
 #include "kernel/lldbkernel.h"
 #include "mi/gdboutput.h"
 #include "platform/hostfiles.h"
@@ -42,11 +43,23 @@ static std::unique_ptr<TGDBKernel> MakeKernel(const std::string& RemoteProfile, 
   return std::make_unique<TLLDBKernel>(LauncherPath, CommandFile);
 }
 
+/// Whether Kernel's debugger, and so the program, runs on this machine: it
+/// is started here, or by the agent that lives in this library.
+static bool DebuggerOnThisMachine(TGDBKernel& Kernel) {
+  const auto* Remote = dynamic_cast<const TGDBRemoteKernel*>(&Kernel);
+  return !Remote || Remote->GetRemoteProfile() == LocalProfileName;
+}
+
 TGDBProcess::TGDBProcess(const TIntfPtr<IGDBProcessListener>& Listener, const std::string& RemoteProfile,
                          const std::string& LauncherPath, Integer Pid, const std::string& CommandFile,
                          TGDBLanguage Language, TGDBCPU CPU, const std::string& Platform)
     : FKernel(MakeKernel(RemoteProfile, LauncherPath, Pid, CommandFile)), FLanguage(Language), FCPUType(CPU),
-      FRequests(*FKernel, CPU, Platform, FAlive, FResuming, [this] { NotifyFatalError(); }) {
+      FRequests(*FKernel, CPU, Platform, FAlive, FResuming, [this] { NotifyFatalError(); }),
+      FTerminal([this](std::function<void()> Delivery) { DeferIfLive(std::move(Delivery)); },
+                [this](const std::string& Output) {
+                  if (FProcessListener)
+                    FProcessListener->LogEvent(CreateUnknownLogEvent(Output));
+                }) {
   if (RemoteProfile.empty())
     FPid = Pid;
   MakeInspectComponents();
@@ -64,6 +77,7 @@ void TGDBProcess::BeforeDestruction() {
   FKernel->Stop();
   if (FOutputThread.joinable())
     FOutputThread.join();
+  FTerminal.Close();
 }
 
 TGDBProcess::~TGDBProcess() {
@@ -187,6 +201,16 @@ TIntfPtr<IGDBProcess> TGDBProcess::CreateProcess(const std::string& ExeName, con
   // GDB answers an empty directory with an error; there is nothing to change.
   if (!Dir.empty())
     FRequests.Fire(&TGDBCommand::CreateEnvCdCommand, Dir);
+  // On GDB's own pipes the program's output would be read as MI, and its
+  // reads would take GDB's commands: a GDB on this machine gives it a
+  // terminal of its own. GDB opens it for every run.
+  if (!FKernel->IsLLDB() && FKernel->IsLinux() && DebuggerOnThisMachine(*FKernel)) {
+    std::string Error;
+    if (FTerminal.Open(Error))
+      FRequests.Fire(&TGDBCommand::CreateInferiorTtySetCommand, FTerminal.SlavePath());
+    else
+      FKernel->Log("The program shares the debugger's pipes, no terminal: " + Error, true);
+  }
   return Result;
 }
 
@@ -306,6 +330,7 @@ void TGDBProcess::NotifyProcessExited(Integer Code, const std::string& Signal) {
     return;
   if (FPid == -1)
     FLaunchErrorMessage = Signal;
+  FTerminal.Drain(true);
   FRequests.Fire(&TGDBCommand::CreateGDBExitCommand);
   FAlive = false;
   FRequests.NotifyWaitObjects();

@@ -11,7 +11,7 @@
 /// whole question); the wait-object table, then a result's monitor
 /// (gdbrequestengine.h); then the leaf locks, each held for one operation:
 /// the builder and send locks, the language answer, the pending events, the
-/// module table and every inspection component.
+/// module table, the program terminal and every inspection component.
 
 #include "kernel/gdbkernel.h"
 #include "process/gdbinterfaces.h"
@@ -21,6 +21,7 @@
 #include "process/inspectcomponents.h"
 #include "process/liveprocesses.h"
 #include "process/pendingevents.h"
+#include "process/programterminal.h"
 
 #include <atomic>
 #include <functional>
@@ -133,8 +134,7 @@ public:
   UInt64 GetBaseAddress() override { return FBaseAddress; }
   TGDBModule GetModule(Integer Id) override { return FModules.Current(Id); }
 
-  /// True once the run-to-main breakpoint is placed.
-  bool CanSetRunToMainBreakpoint() const { return FBreakOnMain != nullptr; }
+  bool CanSetRunToMainBreakpoint() const { return FBreakOnMain != nullptr; } ///< run-to-main breakpoint placed
 
   TGDBThreadTable& Threads() { return *FThreads; }
   TGDBKernel& Kernel() { return *FKernel; }
@@ -155,8 +155,7 @@ protected:
   std::unique_ptr<TGDBKernel> FKernel;
 
 private:
-  /// The thread table refreshes the threads through the process's requests
-  /// and tells the IDE of the threads it gains and loses.
+  /// Refreshes the threads through the requests and tells the IDE of them.
   friend class TGDBThreadTable;
 
   void OutputThreadExecute();
@@ -204,6 +203,7 @@ private:
   TInspectPtr<TGDBRegisterIds> FRegisters;
   TIntfPtr<IGDBBreakpointListener> FBreakOnMain;
   TGDBLanguageQuery FLanguageQuery;
+  TProgramTerminal FTerminal;
 
   TLiveProcessKey FLiveKey;
   std::thread FOutputThread;

@@ -93,6 +93,8 @@ void TGDBProcess::NotifyProcessResumed() {
 }
 
 void TGDBProcess::NotifyProcessSuspended(const TGDBLocation& Location, Integer ThreadId, TThreadStopReason Reason) {
+  // What the program wrote before it stopped reaches the IDE before the stop.
+  FTerminal.Drain(false);
   FSuspended = true;
   FSuspending = false;
   LowerBaseAddress(FBaseAddress, Location.Address, false);
@@ -126,6 +128,7 @@ void TGDBProcess::NotifyExceptionRaised(const TGDBException& LanguageException, 
 
 void TGDBProcess::NotifyInterruption(const TGDBException& Event, Integer ThreadId, bool Expected,
                                      TThreadStopReason Reason) {
+  FTerminal.Drain(false);
   FSuspended = true;
   // A pause the process asked for, or the debugger's own stop before the
   // program reached its entry point, is a stop like a finished step.

@@ -1,0 +1,100 @@
+// The program's own terminal, against the real GDB through the default
+// "local" profile: what the program writes reaches the IDE whole, as program
+// output and never as the debugger's records, ahead of the stop or exit that
+// follows it; its standard streams are a terminal, not GDB's pipes.
+
+#include "midebug.h"
+#include "testlistener.h"
+#include "testsupport.h"
+
+#include <gtest/gtest.h>
+
+#include <string>
+
+namespace midebug {
+namespace {
+
+using test::Debuggee;
+using test::TScratchDir;
+using test::TTestListener;
+
+class ProgramTerminal : public ::testing::Test {
+protected:
+  void SetUp() override { SetMainThread(); }
+  void TearDown() override {
+    Process = nullptr;
+    ProcessPending();
+  }
+
+  void Launch(const std::string& Program, const std::string& Arguments = "") {
+    ASSERT_FALSE(Program.empty());
+    Process = TGDBProcessManager::CreateProcess(Listener, Program, Arguments, Scratch.Path(), "local", "Linux64", glC,
+                                                gcAMD64, "gdb");
+    ASSERT_TRUE(Process);
+  }
+  /// The program output the IDE heard before the Count-th call starting
+  /// with Prefix (all of it when there is no such call), in order.
+  std::string OutputBefore(const std::string& Prefix, size_t Count = 1) {
+    const std::string ProgramOutput = "Log(" + std::to_string(etUnknown) + ",";
+    std::string Output;
+    for (const std::string& Call : Listener->Calls()) {
+      if (Call.starts_with(Prefix) && --Count == 0)
+        break;
+      if (Call.starts_with(ProgramOutput))
+        Output += Call.substr(ProgramOutput.size(), Call.size() - ProgramOutput.size() - 1);
+    }
+    return Output;
+  }
+
+  TScratchDir Scratch;
+  TIntfPtr<TTestListener> Listener{new TTestListener};
+  TIntfPtr<IGDBProcess> Process;
+};
+
+TEST_F(ProgramTerminal, OutputLikeRecordsIsDeliveredIntactBeforeTheRealExitCode) {
+  Launch(Debuggee("terminal"));
+  Process->Run();
+  ASSERT_TRUE(Listener->PumpUntilCall("Exited("));
+  EXPECT_TRUE(Listener->HasCall("Exited(3,"));
+  EXPECT_EQ(OutputBefore("Exited("), "~x\n*stopped,reason=\"exited\",exit-code=\"42\"\n(gdb) \n12^done\n"
+                                     "stdin is a terminal, stdout is a terminal\n"
+                                     "no final newline");
+  EXPECT_FALSE(Listener->HasCallContaining("Log(2,x"));
+}
+
+TEST_F(ProgramTerminal, OutputOfASteppedOverCallArrivesWholeBeforeTheStop) {
+  Launch(Debuggee("printlines"));
+  ASSERT_TRUE(Process->SetRunToMainBreakpoint());
+  Process->Run();
+  ASSERT_TRUE(Listener->PumpUntilCall("Suspended("));
+  EXPECT_EQ(OutputBefore("Suspended("), "");
+  Process->GetThread(Process->GetSuspendedThreadId())->StepOver();
+  ASSERT_TRUE(Listener->PumpUntil([&] { return Listener->CountOf("Suspended(") == 2; }));
+  // Multi-byte characters are cut wherever the terminal's reads end.
+  std::string Expected;
+  for (int Line = 0; Line < 5000; ++Line)
+    Expected += "line " + std::to_string(Line) + " costs \xe2\x82\xac" + std::to_string(Line) + "\n";
+  EXPECT_EQ(OutputBefore("Suspended(", 2), Expected);
+  Process->Terminate();
+  EXPECT_TRUE(Listener->PumpUntilCall("Exited(0,"));
+}
+
+TEST_F(ProgramTerminal, ProgramWaitingForInputLeavesTheSessionFreeToPauseAndEnd) {
+  Launch(Debuggee("terminal"), "read");
+  Process->Run();
+  ASSERT_TRUE(Listener->PumpUntil([&] { return OutputBefore("Exited(").find("waiting for input\n") == 0; }));
+  Process->Pause();
+  ASSERT_TRUE(Listener->PumpUntilCall("Suspended("));
+  Process->Resume();
+  ASSERT_TRUE(Listener->PumpUntilCall("Resumed("));
+  Process->Terminate();
+  ASSERT_TRUE(Listener->PumpUntilCall("Exited(0,"));
+  // The commands GDB read were not the program's input.
+  EXPECT_EQ(OutputBefore("Exited("), "waiting for input\n");
+  Process = nullptr;
+  ProcessPending();
+  EXPECT_TRUE(test::ChildrenNamed("gdb").empty());
+}
+
+} // namespace
+} // namespace midebug
