@@ -13,6 +13,7 @@
 
 #include <algorithm>
 #include <cctype>
+#include <filesystem>
 #include <string_view>
 
 namespace midebug {
@@ -63,8 +64,9 @@ protected:
 
   /// Loads Program under GDB, puts a breakpoint on each of Functions and runs
   /// it to the first stop.
-  void Launch(const std::string& Program, TGDBLanguage Language, const std::vector<std::string>& Functions) {
-    Process = TGDBProcessManager::CreateProcess(Listener, Program, "", "", "local", "Linux64", Language,
+  void Launch(const std::string& Program, TGDBLanguage Language, const std::vector<std::string>& Functions,
+              const std::string& Arguments = "") {
+    Process = TGDBProcessManager::CreateProcess(Listener, Program, Arguments, "", "local", "Linux64", Language,
                                                 gcAMD64, "gdb");
     ASSERT_TRUE(Process);
     for (const std::string& Function : Functions)
@@ -272,6 +274,77 @@ TEST_F(ThreadsTest, PascalFramesShowArgumentValuesAndAnAddressWhereSourceIsMissi
   const std::string Runtime = Thread->GetCallHeader(2);
   EXPECT_TRUE(IsCHeader(Runtime, "SYSTEM_$$_DOEXITPROC"));
   EXPECT_EQ(HeaderAddress(Runtime), Thread->GetCallLocation(2).Address);
+}
+
+
+// tests/debuggees/deep.c stopped in bottom under its recursion: frame k
+// (1-based) from 2 on is recurse(left=k-2), called from line 9, and main,
+// at line 11, is outermost.
+
+/// How many lines of the MI traffic logs in LogDir are commands (after their
+/// token) starting with Command.
+size_t CommandsSent(const std::string& LogDir, const std::string& Command) {
+  std::string Traffic;
+  for (const auto& Log : std::filesystem::directory_iterator(LogDir))
+    Traffic += test::ReadWholeFile(Log.path().string());
+  size_t Count = 0;
+  for (const std::string& Line : test::SplitLines(Traffic)) {
+    const size_t Text = Line.find_first_not_of("0123456789");
+    Count += Text != std::string::npos && std::string_view(Line).substr(Text).starts_with(Command);
+  }
+  return Count;
+}
+
+TEST_F(ThreadsTest, AStopFetchesNoFramesAndTheInnermostFrameOnlyTheFirstWindow) {
+  test::TScratchDir LogDir;
+  test::TScopedEnv Debug("GDB_DEBUG", "1");
+  test::TScopedEnv OutDir("GDB_OUTDIR", LogDir.Path());
+  ASSERT_NO_FATAL_FAILURE(Launch(test::Debuggee("deep"), glC, {"bottom"}));
+  const std::string& Log = LogDir.Path();
+  ASSERT_EQ(CommandsSent(Log, "-stack-info-depth"), 0u);
+  ASSERT_EQ(CommandsSent(Log, "-stack-list-"), 0u) << "nothing is fetched until the IDE asks";
+
+  const TIntfPtr<IGDBThread> Thread = Process->GetThread(Process->GetSuspendedThreadId());
+  EXPECT_TRUE(IsCHeader(Thread->GetCallHeader(1), "bottom(calls=0)"));
+  EXPECT_TRUE(IsCHeader(Thread->GetCallHeader(2), "recurse(left=0)"));
+  EXPECT_EQ(CommandsSent(Log, "-stack-list-frames"), CommandsSent(Log, "-stack-list-frames 0 31"));
+  EXPECT_EQ(CommandsSent(Log, "-stack-list-frames 0 31"), 1u);
+  EXPECT_EQ(CommandsSent(Log, "-stack-list-arguments 1 0 31"), 1u);
+  EXPECT_EQ(CommandsSent(Log, "-stack-info-depth"), 0u);
+}
+
+TEST_F(ThreadsTest, DeepStacksCountEveryFrameDownToMain) {
+  ASSERT_NO_FATAL_FAILURE(Launch(test::Debuggee("deep"), glC, {"bottom"}));
+  const TIntfPtr<IGDBThread> Thread = Process->GetThread(Process->GetSuspendedThreadId());
+  ASSERT_EQ(Thread->GetCallCount(), 10003);
+  EXPECT_TRUE(IsCHeader(Thread->GetCallHeader(10003), "main(argc=1, argv=0x*)"));
+  EXPECT_EQ(Thread->GetCallLocation(10003).Line, 11);
+  EXPECT_TRUE(IsCHeader(Thread->GetCallHeader(5002), "recurse(left=5000)"));
+  EXPECT_EQ(Of(Thread).GetCallParams(5002), (TStringArray{"left"}));
+  EXPECT_EQ(Thread->GetCallLocation(5002).Line, 9);
+  EXPECT_TRUE(IsCHeader(Thread->GetCallHeader(1), "bottom(calls=0)"));
+  EXPECT_EQ(Thread->GetCallHeader(10004), "");
+
+  Of(Thread).SelectFrame(10003);
+  EXPECT_EQ(Of(Thread).FFrameIndex, 10002);
+  EXPECT_EQ(Core().Threads().CurrentLocation().Line, 11) << "the debugger is at main";
+  Of(Thread).SelectFrame(10004);
+  EXPECT_EQ(Of(Thread).FFrameIndex, 10002);
+}
+
+TEST_F(ThreadsTest, AStackDeeperThanCountedEndsInAnEntryThatIsNoFrame) {
+  constexpr Integer Counted = TGDBThreadTable::MaxCallDepth;
+  ASSERT_NO_FATAL_FAILURE(Launch(test::Debuggee("deep"), glC, {"bottom"}, std::to_string(Counted)));
+  const TIntfPtr<IGDBThread> Thread = Process->GetThread(Process->GetSuspendedThreadId());
+  ASSERT_EQ(Thread->GetCallCount(), Counted + 1);
+  EXPECT_TRUE(IsCHeader(Thread->GetCallHeader(Counted), "recurse(left=" + std::to_string(Counted - 2) + ")"));
+  const std::string Beyond = Thread->GetCallHeader(Counted + 1);
+  EXPECT_TRUE(Beyond.starts_with("...")) << Beyond;
+  EXPECT_EQ(Thread->GetCallLocation(Counted + 1).Address, 0u);
+
+  Of(Thread).SelectFrame(Counted);
+  Of(Thread).SelectFrame(Counted + 1);
+  EXPECT_EQ(Of(Thread).FFrameIndex, Counted - 1) << "only counted frames can be selected";
 }
 
 } // namespace
