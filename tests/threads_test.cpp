@@ -13,6 +13,7 @@
 
 #include <algorithm>
 #include <cctype>
+#include <filesystem>
 #include <string_view>
 
 namespace midebug {
@@ -54,8 +55,9 @@ protected:
 
   /// Loads Program under GDB, puts a breakpoint on each of Functions and runs
   /// it to the first stop.
-  void Launch(const std::string& Program, TGDBLanguage Language, const std::vector<std::string>& Functions) {
-    Process = TGDBProcessManager::CreateProcess(Listener, Program, "", "", "local", "Linux64", Language,
+  void Launch(const std::string& Program, TGDBLanguage Language, const std::vector<std::string>& Functions,
+              const std::string& Arguments = "") {
+    Process = TGDBProcessManager::CreateProcess(Listener, Program, Arguments, "", "local", "Linux64", Language,
                                                 gcAMD64, "gdb");
     ASSERT_TRUE(Process);
     for (const std::string& Function : Functions)
@@ -225,6 +227,63 @@ TEST_F(ThreadsTest, PascalFramesShowArgumentValuesAndAnAddressWhereSourceIsMissi
   const std::string Runtime = Thread->GetCallHeader(2);
   EXPECT_TRUE(IsCHeader(Runtime, "SYSTEM_$$_DOEXITPROC"));
   EXPECT_EQ(HeaderAddress(Runtime), Thread->GetCallLocation(2).Address);
+}
+
+
+// tests/debuggees/deep.c stopped in bottom under its recursion: frame k
+// (1-based) from 2 on is recurse(left=k-2), called from line 9, and main,
+// at line 11, is outermost.
+
+/// How many commands in the MI traffic logs in LogDir start with Command.
+size_t CommandsSent(const std::string& LogDir, const std::string& Command) {
+  size_t Count = 0;
+  for (const auto& Log : std::filesystem::directory_iterator(LogDir))
+    for (const std::string& Line : test::SplitLines(test::ReadWholeFile(Log.path().string())))
+      Count += std::string_view(Line).substr(std::min(Line.find_first_not_of("0123456789"), Line.size()))
+                   .starts_with(Command);
+  return Count;
+}
+
+TEST_F(ThreadsTest, AStopFetchesNoFramesAndTheInnermostFrameOnlyTheFirstWindow) {
+  test::TScratchDir LogDir;
+  test::TScopedEnv Debug("GDB_DEBUG", "1");
+  test::TScopedEnv OutDir("GDB_OUTDIR", LogDir.Path());
+  ASSERT_NO_FATAL_FAILURE(Launch(test::Debuggee("deep"), glC, {"bottom"}));
+  ASSERT_EQ(CommandsSent(LogDir.Path(), "-stack-"), 0u) << "nothing is fetched until the IDE asks";
+
+  EXPECT_TRUE(IsCHeader(Process->GetThread(1)->GetCallHeader(1), "bottom(calls=0)"));
+  EXPECT_EQ(CommandsSent(LogDir.Path(), "-stack-"), 2u);
+  EXPECT_EQ(CommandsSent(LogDir.Path(), "-stack-list-frames 0 31"), 1u);
+  EXPECT_EQ(CommandsSent(LogDir.Path(), "-stack-list-arguments 1 0 31"), 1u);
+}
+
+TEST_F(ThreadsTest, DeepStacksCountEveryFrameDownToMain) {
+  ASSERT_NO_FATAL_FAILURE(Launch(test::Debuggee("deep"), glC, {"bottom"}));
+  const TIntfPtr<IGDBThread> Thread = Process->GetThread(1);
+  ASSERT_EQ(Thread->GetCallCount(), 10003);
+  EXPECT_TRUE(IsCHeader(Thread->GetCallHeader(10003), "main(argc=1, argv=0x*)"));
+  EXPECT_TRUE(IsCHeader(Thread->GetCallHeader(5002), "recurse(left=5000)"));
+  EXPECT_EQ(Thread->GetCallLocation(5002).Line, 9);
+  EXPECT_EQ(Thread->GetCallHeader(10004), "");
+
+  Of(Thread).SelectFrame(10003);
+  Of(Thread).SelectFrame(10004);
+  EXPECT_EQ(Of(Thread).FFrameIndex, 10002);
+  EXPECT_EQ(Core().Threads().CurrentLocation().Line, 11) << "the debugger is at main";
+}
+
+TEST_F(ThreadsTest, AStackDeeperThanCountedEndsInAnEntryThatIsNoFrame) {
+  constexpr Integer Counted = TGDBThreadTable::MaxCallDepth;
+  ASSERT_NO_FATAL_FAILURE(Launch(test::Debuggee("deep"), glC, {"bottom"}, std::to_string(Counted)));
+  const TIntfPtr<IGDBThread> Thread = Process->GetThread(1);
+  ASSERT_EQ(Thread->GetCallCount(), Counted + 1);
+  EXPECT_TRUE(IsCHeader(Thread->GetCallHeader(Counted), "recurse(left=" + std::to_string(Counted - 2) + ")"));
+  EXPECT_TRUE(Thread->GetCallHeader(Counted + 1).starts_with("...")) << Thread->GetCallHeader(Counted + 1);
+  EXPECT_EQ(Thread->GetCallLocation(Counted + 1).Address, 0u);
+
+  Of(Thread).SelectFrame(Counted);
+  Of(Thread).SelectFrame(Counted + 1);
+  EXPECT_EQ(Of(Thread).FFrameIndex, Counted - 1) << "only counted frames can be selected";
 }
 
 } // namespace

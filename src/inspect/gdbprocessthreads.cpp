@@ -100,36 +100,39 @@ void TGDBThreadTable::SelectFrame(Integer Frame) {
 
 Integer TGDBThreadTable::CallCount() {
   TStackInfoDepthResult Depth;
-  if (!FProcess.Requests().Ask(Depth, &TGDBCommand::CreateStackInfoDepthCommand, MaxCallFrames))
+  if (!FProcess.Requests().Ask(Depth, &TGDBCommand::CreateStackInfoDepthCommand, MaxCallDepth + 1))
     return 0;
-  return std::clamp(Depth.FStackDepth, 0, MaxCallFrames);
+  return std::clamp(Depth.FStackDepth, 0, MaxCallDepth + 1);
 }
 
-void TGDBThreadTable::CallHeaders(TStackFrameArray& Frames) {
+bool TGDBThreadTable::CallHeaders(Integer Low, Integer High, TStackFrameArray& Frames) {
   Frames.clear();
   Integer Digits = 0;
   TStackListFramesResult Listed;
-  const bool HasFrames = FProcess.Requests().Ask(Listed, [&Digits](TGDBCommand& Builder, std::string& Token) {
+  const bool HasFrames = FProcess.Requests().Ask(Listed, [&](TGDBCommand& Builder, std::string& Token) {
     Digits = Builder.FAddressDigits;
-    return Builder.CreateStackListFramesCommand(Token, 0, MaxCallFrames - 1);
+    return Builder.CreateStackListFramesCommand(Token, Low, High);
   });
-  if (!HasFrames)
-    return;
-  Frames = std::move(Listed.FStackFrames);
+  // The decoder places each frame at the index of its level.
+  const size_t First = static_cast<size_t>(Low);
+  if (!HasFrames || Listed.FStackFrames.size() <= First)
+    return false;
+  Frames.assign(std::make_move_iterator(Listed.FStackFrames.begin() + Low),
+                std::make_move_iterator(Listed.FStackFrames.end()));
 
   TStackListArgumentsResult Arguments;
   // Without arguments the frames keep their bare function names.
-  if (!FProcess.Requests().Ask(Arguments, &TGDBCommand::CreateStackListArgumentsCommand, false, 0, MaxCallFrames - 1))
-    return;
+  if (!FProcess.Requests().Ask(Arguments, &TGDBCommand::CreateStackListArgumentsCommand, false, Low, High))
+    return true;
   const bool Pascal = FProcess.GetEvaluator() == glPascal;
-  const size_t Count = std::min(Arguments.FStackArguments.size(), Frames.size());
-  for (size_t Index = 0; Index < Count; ++Index) {
-    TGDBStackFrame& Frame = Frames[Index];
-    const TNameValueArray& Values = Arguments.FStackArguments[Index].NameValues;
+  const size_t Count = std::min(Arguments.FStackArguments.size(), First + Frames.size());
+  for (size_t Level = First; Level < Count; ++Level) {
+    TGDBStackFrame& Frame = Frames[Level - First];
+    const TNameValueArray& Values = Arguments.FStackArguments[Level].NameValues;
     if (Pascal) {
       Frame.Header = PascalHeader(Frame, Values, Digits);
     } else {
-      if (Index == 0)
+      if (Level == 0)
         Frame.Location = FixupInlineLocation(Frame.Location);
       Frame.Header = CHeader(Frame, Values, Digits);
     }
@@ -137,6 +140,7 @@ void TGDBThreadTable::CallHeaders(TStackFrameArray& Frames) {
     for (const TNameValue& Value : Values)
       Frame.Params.push_back(Value.Name);
   }
+  return true;
 }
 
 void TGDBThreadTable::RefreshList() {

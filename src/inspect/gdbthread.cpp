@@ -8,6 +8,18 @@
 
 namespace midebug {
 
+namespace {
+
+/// What the IDE shows past the frames counted on a stack cut short, in place
+/// of an outermost frame it never saw.
+const TGDBStackFrame& CutMarker() {
+  static const TGDBStackFrame Marker{
+      DummyLocation, "... more than " + std::to_string(TGDBThreadTable::MaxCallDepth) + " frames", {}};
+  return Marker;
+}
+
+} // namespace
+
 TGDBThread::TGDBThread(Integer Id, Integer OsId, const std::string& Name, const std::string& State,
                        TGDBProcess* Process)
     : FId(Id), FOsId(OsId), FName(Name), FState(StrToState(State)), FProcess(Process) {
@@ -31,7 +43,8 @@ TThreadState TGDBThread::StrToState(const std::string& State) {
 
 void TGDBThread::ResetCallStack() {
   FCallCount = -1;
-  FCallHeaders.clear();
+  FCallCountCut = false;
+  FCallWindows.clear();
   FFrameIndex = 0;
   FReason = tsrUnknown;
   FLocation = DummyLocation;
@@ -72,7 +85,7 @@ void TGDBThread::SelectFrame(Integer Frame) {
     return;
   // The debugger refuses a frame beyond the stack but the selection would
   // still be recorded, leaving the thread at a frame it is not at.
-  if (Frame > GetCallCount())
+  if (Frame > GetCallCount() || IsCutMarker(Frame))
     return;
   FProcess->Threads().SelectFrame(Frame - 1);
   FFrameIndex = Frame - 1;
@@ -93,24 +106,35 @@ Integer TGDBThread::GetCallCount() {
     if (!ActsOnThisThread())
       return 0;
     FCallCount = FProcess->Threads().CallCount();
+    FCallCountCut = FCallCount > TGDBThreadTable::MaxCallDepth;
   }
   return FCallCount;
 }
 
-void TGDBThread::RefreshCallStack() {
-  if (FCallHeaders.empty()) {
-    SetAsSuspendedThread();
-    if (ActsOnThisThread())
-      FProcess->Threads().CallHeaders(FCallHeaders);
-  }
-  FCallCount = static_cast<Integer>(FCallHeaders.size());
-}
-
 const TGDBStackFrame* TGDBThread::CallFrame(Integer Index) {
-  RefreshCallStack();
-  if (Index < 1 || Index > FCallCount)
+  if (Index < 1 || (FCallCount != -1 && Index > FCallCount))
     return nullptr;
-  return &FCallHeaders[static_cast<size_t>(Index - 1)];
+  // The first window tells on its own where a shallow stack ends; beyond it
+  // only the depth can refuse a frame past the end without a failed fetch.
+  if (Index > CallWindow && Index > GetCallCount())
+    return nullptr;
+  if (IsCutMarker(Index))
+    return &CutMarker();
+  const Integer Low = (Index - 1) / CallWindow * CallWindow;
+  auto Window = FCallWindows.find(Low);
+  if (Window == FCallWindows.end()) {
+    SetAsSuspendedThread();
+    if (!ActsOnThisThread())
+      return nullptr;
+    TStackFrameArray Frames;
+    if (!FProcess->Threads().CallHeaders(Low, Low + CallWindow - 1, Frames))
+      return nullptr;
+    if (FCallCount == -1 && Frames.size() < static_cast<size_t>(CallWindow))
+      FCallCount = Low + static_cast<Integer>(Frames.size());
+    Window = FCallWindows.emplace(Low, std::move(Frames)).first;
+  }
+  const size_t Offset = static_cast<size_t>(Index - 1 - Low);
+  return Offset < Window->second.size() ? &Window->second[Offset] : nullptr;
 }
 
 std::string TGDBThread::GetCallHeader(Integer Index) {

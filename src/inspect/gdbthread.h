@@ -5,6 +5,7 @@
 #include "mi/gdbcommand.h"
 #include "process/gdbinterfaces.h"
 
+#include <map>
 #include <string>
 
 namespace midebug {
@@ -34,9 +35,6 @@ public:
   /// thread is the process's current thread, and for frame numbers outside
   /// the stack.
   void SelectFrame(Integer Frame);
-  /// Fetches the call stack once per stop; a failed fetch is tried again on
-  /// the next call.
-  void RefreshCallStack();
   /// Parameter names of frame Index (1-based); empty out of range.
   TStringArray GetCallParams(Integer Index);
 
@@ -79,8 +77,17 @@ public:
   Integer FId;
   Integer FOsId;
   std::string FName;
+  /// The real depth, -1 until known. When the stack goes deeper than the
+  /// thread table counts, one more than the frames counted: the last "frame"
+  /// then only says that the stack goes on.
   Integer FCallCount = -1;
-  TStackFrameArray FCallHeaders;
+  bool FCallCountCut = false;
+  /// The frames fetched since the stop, by window: a window's first level
+  /// (a multiple of CallWindow) to its frames, innermost first.
+  std::map<Integer, TStackFrameArray> FCallWindows;
+  /// Frames fetched at a time: a screenful of the IDE's call stack view, so
+  /// that a stop costs the same whatever the depth.
+  static constexpr Integer CallWindow = 32;
   TThreadState FState;
   bool FActive = true;
   TGDBProcess* FProcess;
@@ -97,8 +104,11 @@ private:
   /// process has none (a program whose threads are not listed yet); never
   /// for the zombie.
   bool ActsOnThisThread();
-  /// The frame at Index (1-based) after fetching the stack, or nullptr.
+  /// The frame at Index (1-based), fetching its window once per stop, or
+  /// nullptr. A failed fetch is tried again on the next call.
   const TGDBStackFrame* CallFrame(Integer Index);
+  /// True for the entry past the frames counted on a stack cut short.
+  bool IsCutMarker(Integer Index) const { return FCallCountCut && Index == FCallCount; }
 };
 
 } // namespace midebug

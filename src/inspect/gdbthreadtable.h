@@ -67,12 +67,17 @@ public:
   void Select(Integer ThreadId);
   /// Selects Frame (0-based) of the stopped thread in the debugger.
   void SelectFrame(Integer Frame);
-  /// Depth of the current thread's stack, at most MaxCallFrames; 0 on error.
+  /// Depth of the current thread's stack, counted up to MaxCallDepth + 1 (a
+  /// count above MaxCallDepth means the stack goes deeper still); 0 on error.
   Integer CallCount();
-  /// The current thread's frames (at most MaxCallFrames) with their header
-  /// lines and parameter names; empty on error.
-  void CallHeaders(TStackFrameArray& Frames);
-  static constexpr Integer MaxCallFrames = 512;
+  /// GDB unwinds about 30,000 frames a second; counting this many stays
+  /// within a third of a synchronous request's time-out, so a runaway
+  /// recursion cannot make the IDE ask whether the debugger is lost.
+  static constexpr Integer MaxCallDepth = 50000;
+  /// The current thread's frames at levels Low to High (0-based) with their
+  /// header lines and parameter names, Frames[0] being level Low; fewer when
+  /// the stack ends first. False, with Frames empty, when none was listed.
+  bool CallHeaders(Integer Low, Integer High, TStackFrameArray& Frames);
   /// Refreshes the table from the debugger's list of thread ids and tells
   /// the IDE of the threads gained and lost. Call on the main thread.
   void RefreshList();
