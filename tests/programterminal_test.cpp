@@ -8,7 +8,10 @@
 #include "testsupport.h"
 
 #include <gtest/gtest.h>
+#include <unistd.h>
 
+#include <cstdlib>
+#include <fstream>
 #include <string>
 
 namespace midebug {
@@ -94,6 +97,41 @@ TEST_F(ProgramTerminal, ProgramWaitingForInputLeavesTheSessionFreeToPauseAndEnd)
   Process = nullptr;
   ProcessPending();
   EXPECT_TRUE(test::ChildrenNamed("gdb").empty());
+}
+
+TEST_F(ProgramTerminal, EachQuotedArgumentArrivesExactlyAndNothingRunsInTheShell) {
+  const std::string Injected = Scratch.Path() + "/INJECTED";
+  const TStringArray Arguments = {"$HOME", "*", "x;y", "it's", "\"q w\"", "back\\slash", "two\nlines", "",
+                                  "h\xc3\xa9llo \xe2\x82\xac", "$(touch${IFS}" + Injected + ")", "a b"};
+  Launch(Debuggee("argsecho"), QuoteProgramArguments(Arguments, false));
+  Process->Run();
+  ASSERT_TRUE(Listener->PumpUntilCall("Exited(0,"));
+  std::string Expected;
+  for (const std::string& Argument : Arguments)
+    Expected += "[" + Argument + "]\n";
+  EXPECT_EQ(OutputBefore("Exited("), Expected);
+  EXPECT_FALSE(std::ifstream(Injected).good()) << "the shell ran a command substitution";
+}
+
+TEST_F(ProgramTerminal, LLDBQuotingKeepsEachArgumentWhole) {
+  const char* FromEnvironment = std::getenv("MIDEBUG_LLDB_MI");
+  const std::string LLDB = FromEnvironment ? FromEnvironment : MIDEBUG_LLDB_MI_DEFAULT;
+  if (access(LLDB.c_str(), X_OK) != 0 || system((LLDB + " --version >/dev/null 2>&1").c_str()) != 0)
+    GTEST_SKIP() << "LLDB's MI front end is not at " << LLDB << " (or lacks liblldb-14); set MIDEBUG_LLDB_MI";
+  const TStringArray Arguments = {"$HOME", "*", "x;y", "it's", "\"q w\"", "", "a b"};
+  Process = TGDBProcessManager::CreateProcess(Listener, Debuggee("argsecho"), QuoteProgramArguments(Arguments, true),
+                                              Scratch.Path(), "local", "Linux64", glC, gcAMD64, LLDB);
+  Process->Run();
+  ASSERT_TRUE(Listener->PumpUntilCall("Exited("));
+  // LLDB relays the program's output as its own target stream.
+  std::string Heard;
+  for (const std::string& Call : Listener->Calls())
+    if (Call.starts_with("Log(" + std::to_string(etConsole) + ",["))
+      Heard += Call.substr(6, Call.size() - 7) + "\n";
+  std::string Expected;
+  for (const std::string& Argument : Arguments)
+    Expected += "[" + Argument + "]\n";
+  EXPECT_EQ(Heard, Expected);
 }
 
 } // namespace
