@@ -222,24 +222,10 @@ TGDBCPU GuessCPU(const std::string& Program) {
   }
 }
 
-std::string JoinArguments(const std::vector<std::string>& Arguments) {
-  std::string Line;
-  for (const std::string& Argument : Arguments) {
-    if (!Line.empty())
-      Line += ' ';
-    if (!Argument.empty() && Argument.find_first_of(" \t\"'\\") == std::string::npos) {
-      Line += Argument;
-      continue;
-    }
-    Line += '"';
-    for (char Character : Argument) {
-      if (Character == '"' || Character == '\\')
-        Line += '\\';
-      Line += Character;
-    }
-    Line += '"';
-  }
-  return Line;
+std::string JoinArguments(const std::vector<std::string>& Arguments, const std::string& Debugger) {
+  // The debugger program's name selects LLDB's front end, as in the library.
+  const bool LLDB = std::filesystem::path(Debugger).filename().string().find("lldb") != std::string::npos;
+  return QuoteProgramArguments(Arguments, LLDB);
 }
 
 std::string LanguageName(TGDBLanguage Language) { return std::string(GDBLanguageNames.at(Language)); }

@@ -48,9 +48,9 @@ TGDBLanguage GuessLanguage(const std::string& Program);
 /// the file is not an ELF file of a known machine.
 TGDBCPU GuessCPU(const std::string& Program);
 
-/// Program arguments joined as the debugger's argument line: an argument
-/// holding blanks or quotes is quoted.
-std::string JoinArguments(const std::vector<std::string>& Arguments);
+/// Program arguments as the argument line of Debugger, quoted so that each
+/// reaches the program exactly as given.
+std::string JoinArguments(const std::vector<std::string>& Arguments, const std::string& Debugger);
 
 /// The language's name as the command line spells it.
 std::string LanguageName(TGDBLanguage Language);

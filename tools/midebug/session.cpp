@@ -128,9 +128,10 @@ bool TCliSession::Start() {
     }
     const TGDBLanguage Language = FOptions.Language.value_or(GuessLanguage(FOptions.Program));
     const TGDBCPU CPU = FOptions.CPU.value_or(GuessCPU(FOptions.Program));
-    FProcess = TGDBProcessManager::CreateProcess(FListener, FOptions.Program, JoinArguments(FOptions.Arguments),
-                                                 std::filesystem::current_path().string(), FOptions.Profile, FOptions.Platform, Language, CPU,
-                                                 FOptions.Debugger);
+    const std::string Arguments = JoinArguments(FOptions.Arguments, FOptions.Debugger);
+    FProcess = TGDBProcessManager::CreateProcess(FListener, FOptions.Program, Arguments,
+                                                 std::filesystem::current_path().string(), FOptions.Profile,
+                                                 FOptions.Platform, Language, CPU, FOptions.Debugger);
     FState = TRunState::Loaded;
     FOutput.Emit({{"event", "loaded"},
                   {"program", FOptions.Program},
