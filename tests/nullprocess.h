@@ -42,6 +42,7 @@ public:
   bool SupportHXConsole() override { return false; }
   bool IsDying() override { return false; }
   Integer GetModuleId(const std::string&) override { return 0; }
+  void NotifyCommandRefused(const std::string&) override {}
 };
 
 } // namespace midebug::test

@@ -119,6 +119,7 @@ public:
   Integer GetModuleId(const std::string& Name) override {
     return FModuleIds.try_emplace(Name, static_cast<Integer>(FModuleIds.size()) + 1).first->second;
   }
+  void NotifyCommandRefused(const std::string& Message) override { Record("Refused", Message); }
 
 private:
   void Record(const std::string& Name, const std::string& Arguments) { Calls.push_back(Name + "(" + Arguments + ")"); }

@@ -174,6 +174,24 @@ TEST_F(RunControl, StepsReachTheListenerWithThreadLocationAndReason) {
   EXPECT_TRUE(Listener->HasCall("Exited(2,"));
 }
 
+TEST_F(RunControl, AStepTheDebuggerRefusesIsReportedAndStopsAgainWhereItWas) {
+  Launch(Debuggee("stepping"));
+  ASSERT_TRUE(Process->SetRunToMainBreakpoint());
+  Process->Run();
+  ASSERT_TRUE(NextStop());
+  const TGDBLocation AtMain = StopLocation();
+  const TIntfPtr<IGDBThread> Thread = Process->GetThread(Process->GetSuspendedThreadId());
+  Thread->StepOut();
+  ASSERT_TRUE(NextStop());
+  EXPECT_TRUE(Listener->HasCallContaining("not meaningful in the outermost frame"));
+  EXPECT_EQ(StopLocation().Line, AtMain.Line);
+  EXPECT_EQ(StopReason(), tsrAtBreakpoint);
+  // The session goes on: the next step is taken.
+  Thread->StepOver();
+  ASSERT_TRUE(NextStop());
+  EXPECT_EQ(StopLocation().Line, MainCallLine);
+}
+
 TEST_F(RunControl, PauseOfABusyLoopIsAStepStopAndResumeContinues) {
   Launch(Debuggee("busy"));
   Process->Run();

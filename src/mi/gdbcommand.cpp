@@ -165,15 +165,32 @@ std::string_view PrintValuesFormatWord(TPrintValuesFormat Format) {
   return Format < PrintValuesFormats.size() ? PrintValuesFormats[Format] : std::string_view();
 }
 
-bool IsProcessLaunchCommand(const std::string& Token) {
+/// The command ordinal a token of this builder starts with; 0 for any other
+/// text.
+static int TokenOrdinal(const std::string& Token) {
   if (Token.size() != MiTokenLength)
-    return false;
+    return 0;
   int Ordinal = 0;
   const char* OrdinalEnd = Token.data() + 3;
   const auto [End, Error] = std::from_chars(Token.data(), OrdinalEnd, Ordinal);
-  if (Error != std::errc() || End != OrdinalEnd)
-    Ordinal = 0;
-  return Ordinal == ctExecRun;
+  return Error == std::errc() && End == OrdinalEnd ? Ordinal : 0;
+}
+
+bool IsProcessLaunchCommand(const std::string& Token) { return TokenOrdinal(Token) == ctExecRun; }
+
+bool IsRunControlCommand(const std::string& Token) {
+  switch (TokenOrdinal(Token)) {
+  case ctExecContinue:
+  case ctExecFinish:
+  case ctExecNext:
+  case ctExecNextInstruction:
+  case ctExecStep:
+  case ctExecStepInstruction:
+  case ctExecUntil:
+    return true;
+  default:
+    return false;
+  }
 }
 
 bool XMMRegisterEqual(const TXMMFPURegValue& A, const TXMMFPURegValue& B) {

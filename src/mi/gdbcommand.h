@@ -83,6 +83,9 @@ static_assert(sizeof(TXMMFPURegValue) == 16);
 /// True when the token is an MI token of -exec-run, the command whose reply
 /// tells whether the program could be launched.
 bool IsProcessLaunchCommand(const std::string& Token);
+/// True when Token is that of a command that resumes a stopped program
+/// (continue, a step, finish, until).
+bool IsRunControlCommand(const std::string& Token);
 /// True when all 16 bytes are equal.
 bool XMMRegisterEqual(const TXMMFPURegValue& A, const TXMMFPURegValue& B);
 /// An x87 value is compared as an SSE value is: all 16 bytes.

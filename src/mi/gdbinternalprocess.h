@@ -63,6 +63,9 @@ public:
   virtual bool IsDying() = 0;
   /// A stable id per module name.
   virtual Integer GetModuleId(const std::string& Name) = 0;
+  /// The debugger refused a command that was to resume the stopped program
+  /// ("finish" in the outermost frame): the program did not move.
+  virtual void NotifyCommandRefused(const std::string& Message) = 0;
 };
 
 } // namespace midebug

@@ -231,6 +231,8 @@ void TGDBOutputParser::ProcessErrorWithoutWaiter(const std::string& Message) {
   // request launched it.
   if (IsProcessLaunchCommand(FToken))
     FProcess.NotifyProcessExited(-1, Message);
+  else if (IsRunControlCommand(FToken))
+    FProcess.NotifyCommandRefused(Message);
   else
     FProcess.NotifyProcessFaulted(Message);
 }

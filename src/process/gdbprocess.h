@@ -94,6 +94,7 @@ public:
   bool SupportHXConsole() override { return FKernel->SupportHXConsole(); }
   bool IsDying() override { return FDying; }
   Integer GetModuleId(const std::string& Name) override { return FModules.GetModuleId(Name); }
+  void NotifyCommandRefused(const std::string& Message) override;
 
   // --- IGDBProcess ---------------------------------------------------------
   void CreateSourceBreakpoint(const std::string& FileName, Integer Line,
@@ -146,9 +147,8 @@ public:
 protected:
   /// Stops the debugger's reading and awaits the output thread.
   void BeforeDestruction() override;
-  /// Runs Delivery on the IDE's main thread: at once when called there,
-  /// else queued; only while this process still exists, under the
-  /// live-process lock.
+  /// Runs Delivery on the IDE's main thread (at once when called there),
+  /// only while this process still exists, under the live-process lock.
   void DeferIfLive(std::function<void()> Delivery);
 
   std::atomic<bool> FAlive{false};

@@ -170,6 +170,17 @@ void TGDBProcess::NotifyProcessFaulted(const std::string& Message) {
   });
 }
 
+void TGDBProcess::NotifyCommandRefused(const std::string& Message) {
+  if (!FSuspended) {
+    NotifyProcessFaulted(Message);
+    return;
+  }
+  // The program did not move. The IDE, which is waiting for the stop that
+  // ends the command, hears the stop again where it was, with its reason.
+  FResuming = false;
+  NotifyProcessSuspended(DummyLocation, GetSuspendedThreadId(), tsrNotStopped);
+}
+
 void TGDBProcess::NotifyThreadSelected(Integer ThreadId) {
   FLastSuspendedThreadId = ThreadId;
   if (FAttachNotifySuspended.exchange(false))
