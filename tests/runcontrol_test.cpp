@@ -180,6 +180,8 @@ TEST_F(RunControl, AStepTheDebuggerRefusesIsReportedAndStopsAgainWhereItWas) {
   Process->Run();
   ASSERT_TRUE(NextStop());
   const TGDBLocation AtMain = StopLocation();
+  // Compiled as "gcc stepping.c": the location names the file by its path.
+  EXPECT_EQ(AtMain.Source, test::DebuggeeSource("stepping.c"));
   const TIntfPtr<IGDBThread> Thread = Process->GetThread(Process->GetSuspendedThreadId());
   Thread->StepOut();
   ASSERT_TRUE(NextStop());

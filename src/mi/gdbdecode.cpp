@@ -540,7 +540,11 @@ bool DecodeConsoleResult(TGDBResult& Result, TMIScanner& Scanner) {
 
 void ParseLocation(TMIScanner& Scanner, TGDBLocation& Location) {
   Location.Address = Scanner.FindUInt64("addr", DummyLocation.Address);
-  std::string_view Source = Scanner.FindValue("file");
+  // "file" is the name as compiled, often relative to a directory the IDE
+  // does not know; "fullname" is the path GDB found the file at.
+  std::string_view Source = Scanner.FindValue("fullname");
+  if (Source.empty())
+    Source = Scanner.FindValue("file");
   if (Source.empty())
     Source = Scanner.FindValue("from");
   if (Source == "??")

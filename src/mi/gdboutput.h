@@ -29,8 +29,8 @@ bool DecodeResult(TGDBResult& Result, TMIScanner& Scanner, bool IsLLDB);
 /// Decodes the console record that answers a CLI command, with the cursor
 /// just after its "~".
 bool DecodeConsoleResult(TGDBResult& Result, TMIScanner& Scanner);
-/// Reads "addr", "file" (or "from"), "line" and "original-location" among the
-/// results at the cursor.
+/// Reads "addr", "fullname" (else "file", else "from"), "line" and
+/// "original-location" among the results at the cursor.
 void ParseLocation(TMIScanner& Scanner, TGDBLocation& Location);
 /// Reads the location of the "frame" tuple (DummyLocation without one) and
 /// "thread-id" (-1 without one) among the results at the cursor.
