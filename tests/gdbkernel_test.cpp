@@ -119,9 +119,10 @@ TEST_F(FakeDebuggerTest, PromptInsideOneReadEndsABlockAndTheRestStartsTheNext) {
   EXPECT_EQ(Reply, "2^done\n");
 }
 
-TEST_F(FakeDebuggerTest, ABlockThatIsNotUtf8IsReadAsWindows1252) {
+TEST_F(FakeDebuggerTest, OnlyTheBytesThatAreNotUtf8AreReadAsWindows1252) {
   const std::pair<const char*, const char*> Cases[] = {
-      {"send ~\"caf\\xe9 \\x80 \\x9f\"\nsend ~\"\\xc3\\xa9\"\n", "~\"caf\u00e9 \u20ac \u0178\"\n~\"\u00c3\u00a9\"\n"},
+      // The UTF-8 on the second line stays what it is.
+      {"send ~\"caf\\xe9 \\x80 \\x9f\"\nsend ~\"\\xc3\\xa9\"\n", "~\"caf\u00e9 \u20ac \u0178\"\n~\"\u00e9\"\n"},
       {"send ~\"\\xc3\\xa9\\xe2\\x82\\xac\"\n", "~\"\u00e9\u20ac\"\n"},
   };
   for (const auto& [Script, Expected] : Cases) {

@@ -4,37 +4,48 @@
 
 namespace midebug {
 
+namespace {
+
+/// The length of the UTF-8 sequence at Next, or 0 when none starts there
+/// (a stray byte, a cut sequence, an overlong form, a surrogate).
+size_t SequenceLength(const unsigned char* Next, const unsigned char* End) {
+  const unsigned char Lead = *Next;
+  if (Lead < 0x80)
+    return 1;
+  int Trail;
+  uint32_t CodePoint;
+  uint32_t Minimum;
+  if ((Lead & 0xE0) == 0xC0) {
+    Trail = 1, CodePoint = Lead & 0x1F, Minimum = 0x80;
+  } else if ((Lead & 0xF0) == 0xE0) {
+    Trail = 2, CodePoint = Lead & 0x0F, Minimum = 0x800;
+  } else if ((Lead & 0xF8) == 0xF0) {
+    Trail = 3, CodePoint = Lead & 0x07, Minimum = 0x10000;
+  } else {
+    return 0;
+  }
+  if (End - Next <= Trail)
+    return 0;
+  for (int I = 1; I <= Trail; ++I) {
+    if ((Next[I] & 0xC0) != 0x80)
+      return 0;
+    CodePoint = (CodePoint << 6) | (Next[I] & 0x3F);
+  }
+  if (CodePoint < Minimum || CodePoint > 0x10FFFF || (CodePoint >= 0xD800 && CodePoint <= 0xDFFF))
+    return 0;
+  return static_cast<size_t>(Trail) + 1;
+}
+
+} // namespace
+
 bool IsValidUTF8(std::string_view Bytes) {
   const auto* Next = reinterpret_cast<const unsigned char*>(Bytes.data());
   const auto* End = Next + Bytes.size();
   while (Next < End) {
-    const unsigned char Lead = *Next;
-    if (Lead < 0x80) {
-      ++Next;
-      continue;
-    }
-    int Trail;
-    uint32_t CodePoint;
-    uint32_t Minimum;
-    if ((Lead & 0xE0) == 0xC0) {
-      Trail = 1, CodePoint = Lead & 0x1F, Minimum = 0x80;
-    } else if ((Lead & 0xF0) == 0xE0) {
-      Trail = 2, CodePoint = Lead & 0x0F, Minimum = 0x800;
-    } else if ((Lead & 0xF8) == 0xF0) {
-      Trail = 3, CodePoint = Lead & 0x07, Minimum = 0x10000;
-    } else {
+    const size_t Length = SequenceLength(Next, End);
+    if (Length == 0)
       return false;
-    }
-    if (End - Next <= Trail)
-      return false;
-    for (int I = 1; I <= Trail; ++I) {
-      if ((Next[I] & 0xC0) != 0x80)
-        return false;
-      CodePoint = (CodePoint << 6) | (Next[I] & 0x3F);
-    }
-    if (CodePoint < Minimum || CodePoint > 0x10FFFF || (CodePoint >= 0xD800 && CodePoint <= 0xDFFF))
-      return false;
-    Next += Trail + 1;
+    Next += Length;
   }
   return true;
 }
@@ -93,7 +104,25 @@ size_t CompleteUTF8Length(std::string_view Bytes) {
 }
 
 std::string DecodeUTF8OrAnsi(std::string_view Bytes) {
-  return IsValidUTF8(Bytes) ? std::string(Bytes) : AnsiToUTF8(Bytes);
+  if (IsValidUTF8(Bytes))
+    return std::string(Bytes);
+  // Only the bytes that are no UTF-8 are read as Windows-1252: a stray byte
+  // must not turn the valid text around it into mojibake.
+  std::string Text;
+  Text.reserve(Bytes.size() + Bytes.size() / 4);
+  const auto* Next = reinterpret_cast<const unsigned char*>(Bytes.data());
+  const auto* End = Next + Bytes.size();
+  while (Next < End) {
+    const size_t Length = SequenceLength(Next, End);
+    if (Length != 0) {
+      Text.append(reinterpret_cast<const char*>(Next), Length);
+      Next += Length;
+      continue;
+    }
+    Text += AnsiToUTF8(std::string_view(reinterpret_cast<const char*>(Next), 1));
+    ++Next;
+  }
+  return Text;
 }
 
 } // namespace midebug

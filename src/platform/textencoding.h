@@ -19,8 +19,8 @@ size_t CompleteUTF8Length(std::string_view Bytes);
 /// undefined map to the C1 control of the same value, so no byte is lost.
 std::string AnsiToUTF8(std::string_view Bytes);
 
-/// Bytes as UTF-8 text: unchanged when they are UTF-8, else read as
-/// Windows-1252.
+/// Bytes as UTF-8 text: every valid UTF-8 sequence unchanged, every other
+/// byte read as Windows-1252.
 std::string DecodeUTF8OrAnsi(std::string_view Bytes);
 
 } // namespace midebug
