@@ -12,6 +12,7 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <csignal>
 #include <filesystem>
 
 namespace midebug {
@@ -192,6 +193,19 @@ TEST_F(RunControl, AStepTheDebuggerRefusesIsReportedAndStopsAgainWhereItWas) {
   Thread->StepOver();
   ASSERT_TRUE(NextStop());
   EXPECT_EQ(StopLocation().Line, MainCallLine);
+}
+
+TEST_F(RunControl, ADebuggerThatDiesWhileTheProgramIsStoppedIsReportedAtOnce) {
+  Launch(Debuggee("stepping"));
+  ASSERT_TRUE(Process->SetRunToMainBreakpoint());
+  Process->Run();
+  ASSERT_TRUE(NextStop());
+  const std::vector<int> Debuggers = test::ChildrenNamed("gdb");
+  ASSERT_EQ(Debuggers.size(), 1u);
+  kill(Debuggers[0], SIGKILL);
+  // No request is made: the loss is noticed by the reader alone.
+  ASSERT_TRUE(Listener->PumpUntilCall("Exited("));
+  EXPECT_TRUE(Listener->HasCallContaining("InternalError(Connection to GDB kernel is no longer available"));
 }
 
 TEST_F(RunControl, PauseOfABusyLoopIsAStepStopAndResumeContinues) {
