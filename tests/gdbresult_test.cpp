@@ -8,17 +8,13 @@
 
 #include <algorithm>
 #include <atomic>
-#include <chrono>
-#include <future>
 #include <set>
 #include <string>
-#include <thread>
 #include <vector>
 
 namespace midebug {
 namespace {
 
-using namespace std::chrono_literals;
 
 // ---------------------------------------------------------------------------
 // Result objects
@@ -84,47 +80,6 @@ TEST(RegisterIds, MissingNamesMapToZero) {
   Windows.FNames = Windows.FRegisters;
   Windows.FNames[17] = "rflags";
   EXPECT_EQ(Windows.GetRegisterIds()[17], 17);
-}
-
-// ---------------------------------------------------------------------------
-// Completion hand-shake
-
-TEST(ResultCompletion, WaiterOnAnotherThreadWakesWhenCompleted) {
-  TBreakInsertResult Result;
-  auto Waiter = std::async(std::launch::async, [&Result] {
-    const bool Available = Result.WaitAvailable(10s);
-    return std::make_pair(Available, Available ? Result.FBreakpoint : -2);
-  });
-  std::this_thread::sleep_for(20ms);
-  // The output thread's side: decode, then complete.
-  Result.FBreakpoint = 7;
-  Result.FError = false;
-  const auto Started = std::chrono::steady_clock::now();
-  Result.Complete();
-  ASSERT_EQ(Waiter.wait_for(5s), std::future_status::ready);
-  EXPECT_LT(std::chrono::steady_clock::now() - Started, 5s);
-  const auto [Available, Breakpoint] = Waiter.get();
-  EXPECT_TRUE(Available);
-  EXPECT_EQ(Breakpoint, 7);
-  EXPECT_TRUE(Result.FAvailable);
-}
-
-TEST(ResultCompletion, PulseWakesAMonitorWaitWithoutCompleting) {
-  TExecRunResult Result;
-  std::atomic<bool> GivenUp{false};
-  auto Waiter = std::async(std::launch::async, [&] {
-    std::unique_lock Lock(Result.Monitor());
-    return Result.MonitorSignal().wait_for(Lock, 10s, [&] { return Result.FAvailable || GivenUp; });
-  });
-  std::this_thread::sleep_for(20ms);
-  {
-    std::lock_guard Lock(Result.Monitor());
-    GivenUp = true;
-  }
-  Result.Pulse();
-  ASSERT_EQ(Waiter.wait_for(5s), std::future_status::ready);
-  EXPECT_TRUE(Waiter.get());
-  EXPECT_FALSE(Result.FAvailable);
 }
 
 // ---------------------------------------------------------------------------
