@@ -1,5 +1,4 @@
-// Result objects, the register-id mapping, interface reference counting and
-// the completion hand-shake between the output thread and a requester.
+// Result objects, the register-id mapping and interface reference counting.
 
 #include "mi/gdbresult.h"
 #include "process/gdbinterfaces.h"
@@ -14,7 +13,6 @@
 
 namespace midebug {
 namespace {
-
 
 // ---------------------------------------------------------------------------
 // Result objects
