@@ -2,6 +2,7 @@
 
 #include <benchmark/benchmark.h>
 
+#include <chrono>
 #include <cstdio>
 #include <map>
 
@@ -73,5 +74,15 @@ bool TRawGdbPipes::Write(const std::string& Line) {
 }
 
 Int64 TRawGdbPipes::Read(char* Buffer, size_t Count) { return ReadHandle(FStdOut.ReadHandle(), Buffer, Count); }
+
+bool AwaitStops(const TQuietListener& Listener, int Count) {
+  const auto Deadline = std::chrono::steady_clock::now() + std::chrono::seconds(30);
+  while (Listener.Stops < Count) {
+    if (std::chrono::steady_clock::now() > Deadline)
+      return false;
+    WaitAndProcess(std::chrono::milliseconds(1));
+  }
+  return true;
+}
 
 } // namespace midebug::bench

@@ -59,4 +59,8 @@ private:
 /// the second's. Returns the process exit code.
 int RunAndPrintRatios(int argc, char** argv, const std::vector<std::pair<std::string, std::string>>& Ratios);
 
+/// Pumps the main-thread queue until the listener has seen Count stops;
+/// false after 30 seconds without them.
+bool AwaitStops(const TQuietListener& Listener, int Count);
+
 } // namespace midebug::bench

@@ -37,17 +37,6 @@ int recurse(int left) {
 int main(int argc, char** argv) { return recurse(atoi(argv[1])) & 1; }
 )";
 
-/// Pumps the main-thread queue until the listener has seen Count stops.
-bool AwaitStops(const bench::TQuietListener& Listener, int Count) {
-  const auto Deadline = std::chrono::steady_clock::now() + std::chrono::seconds(30);
-  while (Listener.Stops < Count) {
-    if (std::chrono::steady_clock::now() > Deadline)
-      return false;
-    WaitAndProcess(std::chrono::milliseconds(1));
-  }
-  return true;
-}
-
 /// The program under the library, stopped in spin on a stack Frames deep.
 class TStoppedStack {
 public:
@@ -57,14 +46,14 @@ public:
     if (!static_cast<TGDBProcess*>(FProcess.get())->ProcessAsyncRequest("-break-insert spin"))
       return false;
     FProcess->Run();
-    return AwaitStops(*FListener, 1);
+    return bench::AwaitStops(*FListener, 1);
   }
   /// One stop as the IDE sees it; false when the step did not stop.
   bool Step() {
     const TIntfPtr<IGDBThread> Thread = FProcess->GetThread(FProcess->GetSuspendedThreadId());
     const int Stops = FListener->Stops;
     Thread->StepOver();
-    if (!AwaitStops(*FListener, Stops + 1))
+    if (!bench::AwaitStops(*FListener, Stops + 1))
       return false;
     benchmark::DoNotOptimize(Thread->GetCallHeader(1));
     return true;

@@ -36,17 +36,6 @@ std::string BuildLoopProgram() {
   return std::system(Command.c_str()) == 0 ? Program : std::string();
 }
 
-/// Pumps the main-thread queue until the listener has seen Count stops.
-bool AwaitStops(const bench::TQuietListener& Listener, int Count) {
-  const auto Deadline = std::chrono::steady_clock::now() + std::chrono::seconds(30);
-  while (Listener.Stops < Count) {
-    if (std::chrono::steady_clock::now() > Deadline)
-      return false;
-    WaitAndProcess(std::chrono::milliseconds(1));
-  }
-  return true;
-}
-
 /// GDB on two pipes, answered line by line with blocking reads.
 class TRawGdb : public bench::TRawGdbPipes {
 public:
@@ -97,7 +86,7 @@ void BM_StepOverVsRawMI(benchmark::State& State) {
   }
   Process->SetRunToMainBreakpoint();
   Process->Run();
-  if (Program.empty() || !AwaitStops(*Listener, 1) || !Raw.Start(Program)) {
+  if (Program.empty() || !bench::AwaitStops(*Listener, 1) || !Raw.Start(Program)) {
     State.SkipWithError("cannot reach main");
     return;
   }
@@ -109,7 +98,7 @@ void BM_StepOverVsRawMI(benchmark::State& State) {
     const int Stops = Listener->Stops;
     const TClock::time_point LibraryStart = TClock::now();
     Thread->StepOver();
-    const bool Stopped = AwaitStops(*Listener, Stops + 1);
+    const bool Stopped = bench::AwaitStops(*Listener, Stops + 1);
     benchmark::DoNotOptimize(Thread->GetCallCount());
     benchmark::DoNotOptimize(Thread->GetCallHeader(1));
     const TClock::time_point RawStart = TClock::now();
