@@ -114,10 +114,10 @@ TEST_F(ProgramTerminal, EachQuotedArgumentArrivesExactlyAndNothingRunsInTheShell
 }
 
 TEST_F(ProgramTerminal, LLDBQuotingKeepsEachArgumentWhole) {
-  const char* FromEnvironment = std::getenv("MIDEBUG_LLDB_MI");
-  const std::string LLDB = FromEnvironment ? FromEnvironment : MIDEBUG_LLDB_MI_DEFAULT;
-  if (access(LLDB.c_str(), X_OK) != 0 || system((LLDB + " --version >/dev/null 2>&1").c_str()) != 0)
-    GTEST_SKIP() << "LLDB's MI front end is not at " << LLDB << " (or lacks liblldb-14); set MIDEBUG_LLDB_MI";
+  std::string WhyNot;
+  const std::string LLDB = test::LLDBMIPath(WhyNot);
+  if (LLDB.empty())
+    GTEST_SKIP() << WhyNot;
   const TStringArray Arguments = {"$HOME", "*", "x;y", "it's", "\"q w\"", "", "a b"};
   Process = TGDBProcessManager::CreateProcess(Listener, Debuggee("argsecho"), QuoteProgramArguments(Arguments, true),
                                               Scratch.Path(), "local", "Linux64", glC, gcAMD64, LLDB);
