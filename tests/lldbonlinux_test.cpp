@@ -9,6 +9,7 @@
 
 #include <gtest/gtest.h>
 
+#include <filesystem>
 #include <string>
 
 namespace midebug {
@@ -49,6 +50,21 @@ TEST_F(LLDBOnLinux, ExitCodeIsTheOneTheProgramReturned) {
   EXPECT_TRUE(Listener->HasCall("Exited(3,)"));
   // The question that found the code is not the user's to read.
   EXPECT_FALSE(Listener->HasCallContaining("exited with status"));
+}
+
+TEST_F(LLDBOnLinux, EveryThreadOfAPausedProgramIsStopped) {
+  Launch("idlers");
+  Process->Run();
+  ASSERT_TRUE(Listener->PumpUntil([&] { return std::filesystem::exists(Scratch.Path() + "/started.flag"); }));
+  Process->Pause();
+  ASSERT_TRUE(Listener->PumpUntilCall("Suspended("));
+  for (Integer Id = 1; Id <= 3; ++Id) {
+    const TIntfPtr<IGDBThread> Thread = Process->GetThread(Id);
+    ASSERT_TRUE(Thread) << "thread " << Id;
+    EXPECT_EQ(Thread->GetState(), tsStop) << "thread " << Id;
+  }
+  Process->Terminate();
+  EXPECT_TRUE(Listener->PumpUntilCall("Exited("));
 }
 
 } // namespace
