@@ -16,6 +16,15 @@ std::string TestDataDir() { return MIDEBUG_TEST_DATA; }
 
 std::string Debuggee(const std::string& Name) { return std::string(MIDEBUG_DEBUGGEES) + "/" + Name; }
 
+std::string LLDBMIPath(std::string& WhyNot) {
+  const char* FromEnvironment = std::getenv("MIDEBUG_LLDB_MI");
+  const std::string LLDB = FromEnvironment ? FromEnvironment : MIDEBUG_LLDB_MI_DEFAULT;
+  if (access(LLDB.c_str(), X_OK) == 0 && system((LLDB + " --version >/dev/null 2>&1").c_str()) == 0)
+    return LLDB;
+  WhyNot = "LLDB's MI front end is not at " + LLDB + " (or lacks liblldb-14); set MIDEBUG_LLDB_MI";
+  return {};
+}
+
 std::string DebuggeeSource(const std::string& FileName) {
   return std::string(MIDEBUG_DEBUGGEE_SOURCES) + "/" + FileName;
 }

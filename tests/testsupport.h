@@ -34,6 +34,10 @@ std::string Debuggee(const std::string& Name);
 /// The source file of a debuggee, e.g. DebuggeeSource("loop.c").
 std::string DebuggeeSource(const std::string& FileName);
 
+/// LLDB's MI front end (MIDEBUG_LLDB_MI, else the workplace's copy) when it
+/// runs here; empty, with the reason for a skip in WhyNot, when it does not.
+std::string LLDBMIPath(std::string& WhyNot);
+
 /// Living child processes of this test program with the given name.
 std::vector<int> ChildrenNamed(const std::string& Name);
 

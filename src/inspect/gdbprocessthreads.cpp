@@ -167,8 +167,12 @@ void TGDBThreadTable::RefreshStates(bool StateOnly) {
   if (!Kernel.SupportThreadInfoCommand() || !(FProcess.FAsyncTarget || FProcess.FSuspended))
     return;
   TThreadInfoResult Info(StateOnly);
+  // Windows and Android targets, and lldb-mi on Linux, list every thread of
+  // a stopped program that has no stop reason of its own as "running".
+  const bool ListsStoppedAsRunning =
+      Kernel.IsWindows() || Kernel.IsAndroid64() || (Kernel.IsLLDB() && Kernel.IsLinux());
   if (FProcess.Requests().Ask(Info, &TGDBCommand::CreateThreadInfoCommand, -1) && FProcess.FAlive)
-    Apply(Info, (Kernel.IsWindows() || Kernel.IsAndroid64()) && FProcess.FSuspended);
+    Apply(Info, ListsStoppedAsRunning && FProcess.FSuspended);
   FProcess.FUpdateThreadState = false;
 }
 

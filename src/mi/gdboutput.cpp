@@ -3,6 +3,7 @@
 #include "mi/gdbcommand.h"
 
 #include <array>
+#include <cctype>
 
 namespace midebug {
 
@@ -35,6 +36,36 @@ std::string ReplaceAll(std::string Text, std::string_view From, std::string_view
     At += To.size();
   }
   return Text;
+}
+
+/// The bytes a program wrote, from lldb-mi's target-stream text (its \"
+/// already undone by the scanner). lldb-mi writes a byte above 0x7f as a
+/// sign-extended \xffffffc3; the terminal LLDB gives the program ends its
+/// lines with \r\n, which GDB's program output and the IDE write as \n.
+std::string DecodeLLDBProgramOutput(std::string_view Text) {
+  std::string Bytes;
+  Bytes.reserve(Text.size());
+  for (size_t I = 0; I < Text.size(); ++I) {
+    if (Text[I] != '\\' || I + 1 >= Text.size()) {
+      Bytes += Text[I];
+      continue;
+    }
+    const char Escaped = Text[++I];
+    if (Escaped == 'x') {
+      // Only the last two digits name the byte.
+      unsigned Value = 0;
+      while (I + 1 < Text.size() && std::isxdigit(static_cast<unsigned char>(Text[I + 1]))) {
+        const char Digit = Text[++I];
+        Value = Value * 16 + static_cast<unsigned>(Digit <= '9' ? Digit - '0' : (Digit | 0x20) - 'a' + 10);
+      }
+      Bytes += static_cast<char>(Value & 0xff);
+      continue;
+    }
+    const std::string_view Letters = "nrtabfve", Controls = "\n\r\t\a\b\f\v\x1b";
+    const size_t Letter = Letters.find(Escaped);
+    Bytes += Letter == std::string_view::npos ? Escaped : Controls[Letter];
+  }
+  return ReplaceAll(std::move(Bytes), "\r\n", "\n");
 }
 
 /// Console text with the escapes \n as one blank and \t as three blanks. An
@@ -557,7 +588,13 @@ bool TGDBOutputParser::ProcessConsoleStream() {
 bool TGDBOutputParser::ProcessTargetStream() {
   FScanner.NextChar();
   const std::string_view Text = FScanner.ReadCString();
-  if (!Text.empty())
+  if (Text.empty())
+    return false;
+  // LLDB relays the program's own output on this stream; GDB writes it to
+  // the program's terminal and keeps this stream for its remote targets.
+  if (FIsLLDB)
+    Log(etUnknown, DecodeLLDBProgramOutput(Text));
+  else
     Log(etConsole, std::string(StripTrailingEscapes(Text)));
   return false;
 }

@@ -15,7 +15,7 @@
 
 #include "kernel/gdbkernel.h"
 #include "process/gdbinterfaces.h"
-#include "process/gdblanguagequery.h"
+#include "process/gdbconsolequery.h"
 #include "process/gdbmoduletable.h"
 #include "process/gdbrequestengine.h"
 #include "process/inspectcomponents.h"
@@ -202,7 +202,7 @@ private:
   TInspectPtr<TGDBMemoryCache> FMemory;
   TInspectPtr<TGDBRegisterIds> FRegisters;
   TIntfPtr<IGDBBreakpointListener> FBreakOnMain;
-  TGDBLanguageQuery FLanguageQuery;
+  TGDBConsoleQuery FLanguageQuery{"show language", "The current source language is \"", '"'}; ///< GDB 13's words
   TProgramTerminal FTerminal;
 
   TLiveProcessKey FLiveKey;

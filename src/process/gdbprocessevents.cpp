@@ -62,12 +62,7 @@ TGDBLanguage TGDBProcess::GetCurrentLanguage() {
   // "-gdb-show language" answers GDB 13 with "auto" alone; the console
   // command names the language. Its answer precedes the done record in the
   // same reply, so it has been taken once the request completes.
-  const std::string Answer = FLanguageQuery.Query([this] {
-    TGDBResult Reply(ctInterpreterExec);
-    FRequests.Ask(Reply, [](TGDBCommand& Builder, std::string& Token) {
-      return Builder.CreateMiCommand(ctInterpreterExec, Token) + TGDBLanguageQuery::ConsoleCommand;
-    });
-  });
+  const std::string Answer = FLanguageQuery.Query(FRequests);
   if (!Answer.empty())
     LanguageFromSetting(Answer, Language);
   return Language;

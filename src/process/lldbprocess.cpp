@@ -1,5 +1,6 @@
 #include "process/lldbprocess.h"
 
+#include "mi/miscanner.h"
 #include "platform/hostthread.h"
 
 namespace midebug {
@@ -25,6 +26,29 @@ TLLDBProcess::TLLDBProcess(const TIntfPtr<IGDBProcessListener>& Listener, const 
 void TLLDBProcess::WaitUntilProcessStarted() {
   while (!FProcessStarted && FAlive)
     YieldAndSleep(WaitPolicy().PollMs);
+}
+
+void TLLDBProcess::NotifyLogEvent(const TGDBLogEvent& Event) {
+  if (Event.Event == etConsole && FExitStatusQuery.TakeAnswer(Event.Data))
+    return;
+  TGDBProcess::NotifyLogEvent(Event);
+}
+
+void TLLDBProcess::NotifyProcessExited(Integer Code, const std::string& Signal) {
+  // lldb-mi reports every exit as "exited-normally" with code 0, whatever
+  // the program returned; its console still knows the code. A kill the IDE
+  // asked for, a signal or a lost connection says all there is to say.
+  const bool Normal = IsLLDB() && Code == 0 && Signal.empty() && !IsDying();
+  if (!Normal || !FAlive || FExitCodeAsked.exchange(true)) {
+    TGDBProcess::NotifyProcessExited(Code, Signal);
+    return;
+  }
+  // The question waits for its reply, which the output thread reads: it is
+  // asked on the main thread, after the program output already queued.
+  DeferIfLive([this] {
+    const Integer Status = MIStrToIntDef(FExitStatusQuery.Query(Requests()), 0);
+    TGDBProcess::NotifyProcessExited(Status, "");
+  });
 }
 
 } // namespace midebug

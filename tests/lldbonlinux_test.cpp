@@ -1,0 +1,71 @@
+// LLDB's MI front end on Linux, the real one, through the "local" profile:
+// what it reports wrongly or in GDB's words for something else (exit codes,
+// the program's output, the state of paused threads) reaches the IDE as it
+// is.
+
+#include "midebug.h"
+#include "testlistener.h"
+#include "testsupport.h"
+
+#include <gtest/gtest.h>
+
+#include <filesystem>
+#include <string>
+
+namespace midebug {
+namespace {
+
+using test::Debuggee;
+using test::TTestListener;
+
+class LLDBOnLinux : public ::testing::Test {
+protected:
+  void SetUp() override {
+    SetMainThread();
+    std::string WhyNot;
+    LLDB = test::LLDBMIPath(WhyNot);
+    if (LLDB.empty())
+      GTEST_SKIP() << WhyNot;
+  }
+  void TearDown() override {
+    Process = nullptr;
+    ProcessPending();
+  }
+  void Launch(const std::string& Program, const std::string& Arguments = "") {
+    Process = TGDBProcessManager::CreateProcess(Listener, Debuggee(Program), Arguments, Scratch.Path(), "local",
+                                                "Linux64", glC, gcAMD64, LLDB);
+    ASSERT_TRUE(Process);
+  }
+
+  std::string LLDB;
+  test::TScratchDir Scratch;
+  TIntfPtr<TTestListener> Listener{new TTestListener};
+  TIntfPtr<IGDBProcess> Process;
+};
+
+TEST_F(LLDBOnLinux, ExitCodeIsTheOneTheProgramReturned) {
+  Launch("exitthree");
+  Process->Run();
+  ASSERT_TRUE(Listener->PumpUntilCall("Exited("));
+  EXPECT_TRUE(Listener->HasCall("Exited(3,)"));
+  // The question that found the code is not the user's to read.
+  EXPECT_FALSE(Listener->HasCallContaining("exited with status"));
+}
+
+TEST_F(LLDBOnLinux, EveryThreadOfAPausedProgramIsStopped) {
+  Launch("idlers");
+  Process->Run();
+  ASSERT_TRUE(Listener->PumpUntil([&] { return std::filesystem::exists(Scratch.Path() + "/started.flag"); }));
+  Process->Pause();
+  ASSERT_TRUE(Listener->PumpUntilCall("Suspended("));
+  for (Integer Id = 1; Id <= 3; ++Id) {
+    const TIntfPtr<IGDBThread> Thread = Process->GetThread(Id);
+    ASSERT_TRUE(Thread) << "thread " << Id;
+    EXPECT_EQ(Thread->GetState(), tsStop) << "thread " << Id;
+  }
+  Process->Terminate();
+  EXPECT_TRUE(Listener->PumpUntilCall("Exited("));
+}
+
+} // namespace
+} // namespace midebug
