@@ -66,14 +66,6 @@ TEST(DecoderBreakpoints, LocationsInsideBkpt) {
   EXPECT_EQ(Result.FLocation.Line, 7);
 }
 
-TEST(DecoderBreakpoints, DottedNumberFailsAndKeepsTheLocation) {
-  TBreakInsertResult Result;
-  Result.FLocation.Line = 99;
-  EXPECT_FALSE(Decode(Result, R"(7^done,bkpt={number="1.2",addr="0x10",file="a.c",line="3"})"));
-  EXPECT_EQ(Result.FBreakpoint, -1);
-  EXPECT_EQ(Result.FLocation.Line, 99);
-}
-
 TEST(DecoderBreakpoints, MatchesGiveAddresses) {
   struct TCase {
     std::string Reply;

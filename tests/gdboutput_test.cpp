@@ -167,17 +167,6 @@ TEST(ParserResults, CLIReplyRoutedThroughTheLogStream) {
   EXPECT_EQ(InfoLine.FAddress, 0x1205u);
 }
 
-TEST(ParserResults, CLIKillCompletesAndKeepsTheNextLine) {
-  TRecordingProcess Process;
-  TCLKillResult Kill;
-  Kill.FError = true;
-  Process.Register("kill\\n", Kill);
-  const TCalls Calls = Parse("&\"kill\\n\"\n~\"[Inferior 1 (process 9773) killed]\\n\"\n", Process);
-  EXPECT_TRUE(Kill.FAvailable);
-  EXPECT_FALSE(Kill.FError);
-  EXPECT_EQ(Calls, TCalls{LogConsole("[Inferior 1 (process 9773) killed] ")});
-}
-
 TEST(ParserResults, CLIReplyWithoutConsoleAnswerLeavesTheNextRecord) {
   TRecordingProcess Process;
   TCLInfoLineAddressResult InfoLine("prog.c", 12);
@@ -188,15 +177,6 @@ TEST(ParserResults, CLIReplyWithoutConsoleAnswerLeavesTheNextRecord) {
 }
 
 // --- Stop records ---------------------------------------------------------------
-
-TEST(ParserStops, BreakpointHandledByTheProcessIsNoSuspension) {
-  const std::string Stop = R"(*stopped,reason="breakpoint-hit",bkptno="1",frame={addr="0x0000555555555204",)"
-                           R"(file="prog.c",line="7"},thread-id="1")"
-                           "\n";
-  TRecordingProcess Handled;
-  Handled.BreakpointHandled = true;
-  EXPECT_EQ(Parse(Stop, Handled), TCalls{"Breakpoint(1,prog.c:7@0x555555555204,1)"});
-}
 
 TEST(ParserStops, ReasonsAndTheirNotifications) {
   struct TCase {

@@ -1,4 +1,4 @@
-// Result objects, the register-id mapping and interface reference counting.
+// Result objects and interface reference counting.
 
 #include "mi/gdbresult.h"
 #include "process/gdbinterfaces.h"
@@ -57,27 +57,6 @@ TEST(ResultThreadNames, FixupNameKeepsTheShortName) {
   };
   for (const Case& Each : Cases)
     EXPECT_EQ(TThreadInfoResult::FixupName(Each.Name), Each.Expected) << Each.Name;
-}
-
-// ---------------------------------------------------------------------------
-// Register-id mapping
-
-TEST(RegisterIds, MissingNamesMapToZero) {
-  TDataListRegisterNamesResult Result(gcIA32, "Linux");
-  Result.FNames = Result.FRegisters;
-  Result.FNames[9] = "flags"; // the debugger calls eflags something else
-  const TIntegerArray Ids = Result.GetRegisterIds();
-  ASSERT_EQ(Ids.size(), 16u);
-  EXPECT_EQ(Ids[9], 0);
-  EXPECT_EQ(Ids[8], 8);
-  EXPECT_EQ(Ids[10], 10) << "the entry after a missing one is still found";
-  EXPECT_EQ(Ids[15], 15);
-
-  // A debugger's rflags is the eflags of Windows.
-  TDataListRegisterNamesResult Windows(gcAMD64, "Win64");
-  Windows.FNames = Windows.FRegisters;
-  Windows.FNames[17] = "rflags";
-  EXPECT_EQ(Windows.GetRegisterIds()[17], 17);
 }
 
 // ---------------------------------------------------------------------------
