@@ -396,7 +396,7 @@ TEST_F(RunControlFake, SilentStopsAndFaultsEndInTheExit) {
   }
 }
 
-TEST_F(RunControlFake, LaunchRefusedBeforeAProcessIdReachesGetPid) {
+TEST_F(RunControlFake, LaunchRefusedBeforeAProcessIdEndsTheSessionAndSaysWhy) {
   Run("runcontrol-launch-fails.script");
   try {
     Process->GetPid();
@@ -406,7 +406,7 @@ TEST_F(RunControlFake, LaunchRefusedBeforeAProcessIdReachesGetPid) {
   }
   EXPECT_FALSE(ProcessOf(Process).Alive());
   ProcessPending();
-  EXPECT_FALSE(Listener->HasCall("Exited("));
+  EXPECT_TRUE(Listener->HasCall("Exited(-1,During startup program exited with code 126.)"));
 }
 
 } // namespace

@@ -336,9 +336,12 @@ void TGDBProcess::NotifyProcessExited(Integer Code, const std::string& Signal) {
   FRequests.NotifyWaitObjects();
   // A process the IDE has let go meanwhile reports nothing: the IDE asked to
   // hear no more of it.
-  DeferIfLive([this, Code, Signal] {
+  // A program that never started is reported only when its launch was
+  // refused: the IDE, waiting for it to run, learns why at once.
+  const bool Report = FPid != -1 || !Signal.empty();
+  DeferIfLive([this, Code, Signal, Report] {
     NotifyAllThreadExited();
-    if (FProcessListener && FPid != -1)
+    if (FProcessListener && Report)
       FProcessListener->ProcessExited(Code, Signal);
   });
 }
