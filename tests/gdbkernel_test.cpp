@@ -1,7 +1,6 @@
 // The local debugger transport against the real GDB and the scripted fake.
 
 #include "kernel/gdbkernel.h"
-#include "kernel/lldbkernel.h"
 #include "midebug.h"
 #include "platform/hostthread.h"
 #include "testsupport.h"
@@ -22,11 +21,10 @@ using test::TScratchDir;
 /// A kernel running the fake debugger on a script given inline.
 class FakeDebuggerTest : public ::testing::Test {
 protected:
-  template <class TKernel = TGDBKernel>
-  std::unique_ptr<TKernel> StartFake(const std::string& Script) {
+  std::unique_ptr<TGDBKernel> StartFake(const std::string& Script) {
     ScriptEnv.reset();
     ScriptEnv = std::make_unique<TScopedEnv>("FAKEMI_SCRIPT", Scratch.WriteFile("fake.script", Script));
-    auto Kernel = std::make_unique<TKernel>(FakeDebuggerPath(), "");
+    auto Kernel = std::make_unique<TGDBKernel>(FakeDebuggerPath(), "");
     EXPECT_TRUE(Kernel->Start()) << Kernel->GetLastError(false);
     return Kernel;
   }
@@ -164,13 +162,6 @@ TEST_F(FakeDebuggerTest, CommandFileIsPassedAndTheDebuggerRunsBesideIt) {
   }
   // The command file is the kernel's: it goes with it.
   EXPECT_FALSE(std::filesystem::exists(CommandFile));
-}
-
-TEST_F(FakeDebuggerTest, LldbPromptEndsAReplyWithoutTheBlank) {
-  auto Kernel = StartFake<TLLDBKernel>("send ^done\nsendraw (gdb)\\n\nwait-eof\n");
-  std::string Reply;
-  ASSERT_TRUE(Kernel->GetReply(Reply));
-  EXPECT_EQ(Reply, "^done\n");
 }
 
 } // namespace

@@ -52,6 +52,14 @@ TEST_F(LLDBOnLinux, ExitCodeIsTheOneTheProgramReturned) {
   EXPECT_FALSE(Listener->HasCallContaining("exited with status"));
 }
 
+TEST_F(LLDBOnLinux, WithoutAProfileALinuxTargetTakesNoAndroidRoute) {
+  Process = TGDBProcessManager::CreateProcess(Listener, Debuggee("exitthree"), "", Scratch.Path(), "", "Linux64", glC,
+                                              gcAMD64, LLDB);
+  Process->Run();
+  ASSERT_TRUE(Listener->PumpUntilCall("Exited("));
+  EXPECT_TRUE(Listener->HasCall("Exited(3,)"));
+}
+
 TEST_F(LLDBOnLinux, EveryThreadOfAPausedProgramIsStopped) {
   Launch("idlers");
   Process->Run();

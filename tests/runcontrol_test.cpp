@@ -208,6 +208,14 @@ TEST_F(RunControl, ADebuggerThatDiesWhileTheProgramIsStoppedIsReportedAtOnce) {
   EXPECT_TRUE(Listener->HasCallContaining("InternalError(Connection to GDB kernel is no longer available"));
 }
 
+TEST_F(RunControl, WithoutAProfileGdbOnThisMachineIsStartedAsOnTheLocalOne) {
+  Process = TGDBProcessManager::CreateProcess(Listener, Debuggee("exitthree"), "", Scratch.Path(), "", "Linux64", glC,
+                                              gcAMD64, "/usr/bin/gdb");
+  Process->Run();
+  ASSERT_TRUE(Listener->PumpUntilCall("Exited("));
+  EXPECT_TRUE(Listener->HasCall("Exited(3,)"));
+}
+
 TEST_F(RunControl, PauseOfABusyLoopIsAStepStopAndResumeContinues) {
   Launch(Debuggee("busy"));
   Process->Run();

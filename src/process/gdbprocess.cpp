@@ -5,6 +5,7 @@
 #include "kernel/lldbkernel.h"
 #include "mi/gdboutput.h"
 #include "platform/hostfiles.h"
+#include "platform/hostinfo.h"
 #include "platform/hostthread.h"
 #include "platform/mainthread.h"
 
@@ -36,10 +37,17 @@ bool ParseInteger(const std::string& Text, Integer& Value) {
 
 } // namespace
 
+/// The kernel for a profile and debugger. Without a profile, LLDB's front
+/// end debugs a Windows target, or an Android one through its bridge, by
+/// itself; any other debugger (GDB), or a target of this machine, is started
+/// by the agent that lives in this library, which knows how to start each.
 static std::unique_ptr<TGDBKernel> MakeKernel(const std::string& RemoteProfile, const std::string& LauncherPath,
-                                              Integer Pid, const std::string& CommandFile) {
+                                              Integer Pid, const std::string& CommandFile, const std::string& Platform) {
   if (!RemoteProfile.empty())
     return std::make_unique<TGDBRemoteKernel>(RemoteProfile, LauncherPath, Pid);
+  const bool LLDBFrontEnd = ExtractFileName(LauncherPath) == LLDBFrontEndFileName;
+  if (!LLDBFrontEnd || Platform.starts_with("Linux"))
+    return std::make_unique<TGDBRemoteKernel>(LocalProfileName, LauncherPath, Pid);
   return std::make_unique<TLLDBKernel>(LauncherPath, CommandFile);
 }
 
@@ -53,7 +61,7 @@ static bool DebuggerOnThisMachine(TGDBKernel& Kernel) {
 TGDBProcess::TGDBProcess(const TIntfPtr<IGDBProcessListener>& Listener, const std::string& RemoteProfile,
                          const std::string& LauncherPath, Integer Pid, const std::string& CommandFile,
                          TGDBLanguage Language, TGDBCPU CPU, const std::string& Platform)
-    : FKernel(MakeKernel(RemoteProfile, LauncherPath, Pid, CommandFile)), FLanguage(Language), FCPUType(CPU),
+    : FKernel(MakeKernel(RemoteProfile, LauncherPath, Pid, CommandFile, Platform)), FLanguage(Language), FCPUType(CPU),
       FRequests(*FKernel, CPU, Platform, FAlive, FResuming, [this] { NotifyFatalError(); }),
       FTerminal([this](std::function<void()> Delivery) { DeferIfLive(std::move(Delivery)); },
                 [this](const std::string& Output) {
