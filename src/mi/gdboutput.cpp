@@ -1,9 +1,9 @@
 #include "mi/gdboutput.h"
 
 #include "mi/gdbcommand.h"
+#include "platform/hexdigits.h"
 
 #include <array>
-#include <cctype>
 
 namespace midebug {
 
@@ -54,10 +54,8 @@ std::string DecodeLLDBProgramOutput(std::string_view Text) {
     if (Escaped == 'x') {
       // Only the last two digits name the byte.
       unsigned Value = 0;
-      while (I + 1 < Text.size() && std::isxdigit(static_cast<unsigned char>(Text[I + 1]))) {
-        const char Digit = Text[++I];
-        Value = Value * 16 + static_cast<unsigned>(Digit <= '9' ? Digit - '0' : (Digit | 0x20) - 'a' + 10);
-      }
+      while (I + 1 < Text.size() && HexDigitValue(Text[I + 1]) >= 0)
+        Value = Value * 16 + static_cast<unsigned>(HexDigitValue(Text[++I]));
       Bytes += static_cast<char>(Value & 0xff);
       continue;
     }
