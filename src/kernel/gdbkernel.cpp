@@ -3,6 +3,7 @@
 #include "platform/hostfiles.h"
 #include "platform/hostinfo.h"
 #include "platform/hostthread.h"
+#include "platform/quoting.h"
 #include "platform/textencoding.h"
 
 #include <cstdio>
@@ -25,18 +26,6 @@ constexpr Int64 DefaultCapabilities = capThreadNotification | capThreadInfoComma
                                       (HostEndsLinesWithCRLF ? Int64{capCRLFLineEnds} : Int64{0});
 
 std::string LineEnd(bool CRLF) { return CRLF ? "\r\n" : "\n"; }
-
-/// A program path or file for the command line: in double quotes, with the
-/// quote and backslash escaped so that the line splits back into the path.
-std::string QuoteArgument(const std::string& Text) {
-  std::string Quoted = "\"";
-  for (const char C : Text) {
-    if (C == '"' || C == '\\')
-      Quoted += '\\';
-    Quoted += C;
-  }
-  return Quoted + '"';
-}
 
 } // namespace
 
@@ -102,9 +91,9 @@ void TGDBKernel::Log(const std::string& Text, bool NewLine) {
 }
 
 std::string TGDBKernel::GetCommandLine() {
-  std::string CommandLine = QuoteArgument(FLauncherPath) + " " + FLauncherParams;
+  std::string CommandLine = DoubleQuoted(FLauncherPath) + " " + FLauncherParams;
   if (!FCommandFile.empty())
-    CommandLine += " " + GetCommandFileOption() + " " + QuoteArgument(FCommandFile);
+    CommandLine += " " + GetCommandFileOption() + " " + DoubleQuoted(FCommandFile);
   return CommandLine;
 }
 

@@ -1,6 +1,7 @@
 #include "mi/gdbcommand.h"
 
 #include "mi/gdbregisters.h"
+#include "platform/quoting.h"
 
 #include <algorithm>
 #include <array>
@@ -64,19 +65,6 @@ std::string ByteList(const Byte* Data, Integer Count) {
   return List;
 }
 
-/// Text as an MI c-string: in double quotes, with backslash and double quote
-/// escaped, so that GDB's argument splitter hands it over unchanged.
-std::string QuoteCString(std::string_view Text) {
-  std::string Quoted = "\"";
-  for (const char Character : Text) {
-    if (Character == '\\' || Character == '"')
-      Quoted += '\\';
-    Quoted += Character;
-  }
-  Quoted += '"';
-  return Quoted;
-}
-
 /// Text as an MI c-string whose escapes GDB decodes: line breaks and tabs
 /// travel as \n, \r and \t instead of ending the command line.
 std::string EscapeCString(std::string_view Text) {
@@ -129,7 +117,7 @@ std::string NumberList(const std::vector<Integer>& Numbers) {
 }
 
 std::string NameArgument(const std::string& Name, bool Quoted) {
-  return " " + (Quoted ? QuoteCString(Name) : Name);
+  return " " + (Quoted ? DoubleQuoted(Name) : Name);
 }
 
 UInt64 FirstInt64(const TXMMFPURegValue& Value) {
@@ -318,7 +306,7 @@ std::string TGDBCommand::CreateSetArgsCommand(std::string& Token, const std::str
 }
 
 std::string TGDBCommand::CreateEnvCdCommand(std::string& Token, const std::string& Dir) {
-  return MiLine(Token, ctEnvironmentCd, " " + QuoteCString(Dir));
+  return MiLine(Token, ctEnvironmentCd, " " + DoubleQuoted(Dir));
 }
 
 std::string TGDBCommand::CreateEnvDirCommand(std::string& Token, const std::vector<std::string>& Dirs, bool Reset) {
@@ -337,7 +325,7 @@ std::string TGDBCommand::CreateEnvPathCommand(std::string& Token, const std::vec
 }
 
 std::string TGDBCommand::CreateInferiorTtySetCommand(std::string& Token, const std::string& TtyPath) {
-  return MiLine(Token, ctInferiorTtySet, " " + QuoteCString(TtyPath));
+  return MiLine(Token, ctInferiorTtySet, " " + DoubleQuoted(TtyPath));
 }
 
 std::string TGDBCommand::CreateThreadInfoCommand(std::string& Token, Integer ThreadId) {
@@ -489,7 +477,7 @@ std::string TGDBCommand::CreateVarAssignCommand(std::string& Token, const std::s
   // the c-string and evaluates 'x'. Without its single quotes it would read x
   // as a variable name.
   const bool IsCharLiteral = Value.size() >= 2 && Value.front() == '\'' && Value.back() == '\'';
-  const std::string Assigned = !IsLLDB && TypeName == "char" && IsCharLiteral ? QuoteCString(Value) : Value;
+  const std::string Assigned = !IsLLDB && TypeName == "char" && IsCharLiteral ? DoubleQuoted(Value) : Value;
   return MiLine(Token, ctVarAssign, " " + Name + " " + Assigned);
 }
 
@@ -646,7 +634,7 @@ std::string TGDBCommand::CreateSymbolListLinesCommand(std::string& Token, const 
 // Program, target and debugger
 
 std::string TGDBCommand::CreateFileExecAndSymbolsCommand(std::string& Token, const std::string& File) {
-  return MiLine(Token, ctFileExecAndSymbols, " " + QuoteCString(File));
+  return MiLine(Token, ctFileExecAndSymbols, " " + DoubleQuoted(File));
 }
 
 std::string TGDBCommand::CreateFileListExecSourceFileCommand(std::string& Token) {
@@ -693,7 +681,7 @@ std::string TGDBCommand::CreateEnableDebugHookCommand(std::string& Token, const 
 
 std::string TGDBCommand::CreateInterpreterExecCommand(std::string& Token, TMiCommand Command) {
   // Unquoted, GDB would run each word of "info line" as a command of its own.
-  return MiLine(Token, ctInterpreterExec, " console " + QuoteCString(CreateCLCommand(Command)));
+  return MiLine(Token, ctInterpreterExec, " console " + DoubleQuoted(CreateCLCommand(Command)));
 }
 
 // CLI commands answered through GDB's echo of the line
@@ -740,7 +728,7 @@ std::string TGDBCommand::CreateCLSettingsShowCommand(std::string& Token, const s
 }
 
 std::string TGDBCommand::CreateCLCommandSourceCommand(std::string& Token, const std::string& File) {
-  return EchoedCLLine(Token, ctCLCommandSource, " " + QuoteCString(File));
+  return EchoedCLLine(Token, ctCLCommandSource, " " + DoubleQuoted(File));
 }
 
 } // namespace midebug

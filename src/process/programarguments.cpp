@@ -1,5 +1,7 @@
 #include "process/programarguments.h"
 
+#include "platform/quoting.h"
+
 namespace midebug {
 
 namespace {
@@ -17,18 +19,6 @@ std::string ShellQuoted(const std::string& Argument) {
   return Quoted + "'";
 }
 
-/// "text" as LLDB's front end reads an argument: a backslash escapes a
-/// double quote or a backslash.
-std::string LLDBQuoted(const std::string& Argument) {
-  std::string Quoted = "\"";
-  for (const char Character : Argument) {
-    if (Character == '"' || Character == '\\')
-      Quoted += '\\';
-    Quoted += Character;
-  }
-  return Quoted + "\"";
-}
-
 } // namespace
 
 std::string QuoteProgramArguments(const TStringArray& Arguments, bool ForLLDB) {
@@ -36,7 +26,7 @@ std::string QuoteProgramArguments(const TStringArray& Arguments, bool ForLLDB) {
   for (const std::string& Argument : Arguments) {
     if (!Text.empty())
       Text += ' ';
-    Text += ForLLDB ? LLDBQuoted(Argument) : ShellQuoted(Argument);
+    Text += ForLLDB ? DoubleQuoted(Argument) : ShellQuoted(Argument);
   }
   return Text;
 }
