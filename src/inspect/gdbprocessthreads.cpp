@@ -236,7 +236,7 @@ void TGDBProcess::NotifyThreadCreated(Integer ThreadId, Integer OsId) {
     return;
   if (!FThreads->Add(ThreadId, OsId, "", ""))
     return;
-  FThreadCreatedPending.Raise(ThreadId, [this](auto Delivery) { DeferIfLive(std::move(Delivery)); },
+  FThreadCreatedPending.Raise(ThreadId, FDeferIfLive,
                               [this](Integer Id) {
                                 if (!FDying && !FRequests.FatalError() && FProcessListener)
                                   FProcessListener->ThreadCreated(Id);
@@ -250,7 +250,7 @@ void TGDBProcess::NotifyThreadExited(Integer ThreadId) {
   // delivery; they must not keep later exits from being delivered.
   const bool Known = FThreads->Remove(ThreadId);
   FThreadExitedPending.Raise(
-      ThreadId, [this](auto Delivery) { DeferIfLive(std::move(Delivery)); },
+      ThreadId, FDeferIfLive,
       [this](Integer Id) {
         if (FProcessListener)
           FProcessListener->ThreadExited(Id);

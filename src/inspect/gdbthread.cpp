@@ -43,7 +43,6 @@ TThreadState TGDBThread::StrToState(const std::string& State) {
 
 void TGDBThread::ResetCallStack() {
   FCallCount = -1;
-  FCallCountCut = false;
   FCallWindows.clear();
   FFrameIndex = 0;
   FReason = tsrUnknown;
@@ -106,9 +105,12 @@ Integer TGDBThread::GetCallCount() {
     if (!ActsOnThisThread())
       return 0;
     FCallCount = FProcess->Threads().CallCount();
-    FCallCountCut = FCallCount > TGDBThreadTable::MaxCallDepth;
   }
   return FCallCount;
+}
+
+bool TGDBThread::IsCutMarker(Integer Index) const {
+  return FCallCount > TGDBThreadTable::MaxCallDepth && Index == FCallCount;
 }
 
 const TGDBStackFrame* TGDBThread::CallFrame(Integer Index) {

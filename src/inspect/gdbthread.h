@@ -81,7 +81,6 @@ public:
   /// thread table counts, one more than the frames counted: the last "frame"
   /// then only says that the stack goes on.
   Integer FCallCount = -1;
-  bool FCallCountCut = false;
   /// The frames fetched since the stop, by window: a window's first level
   /// (a multiple of CallWindow) to its frames, innermost first.
   std::map<Integer, TStackFrameArray> FCallWindows;
@@ -108,7 +107,7 @@ private:
   /// nullptr. A failed fetch is tried again on the next call.
   const TGDBStackFrame* CallFrame(Integer Index);
   /// True for the entry past the frames counted on a stack cut short.
-  bool IsCutMarker(Integer Index) const { return FCallCountCut && Index == FCallCount; }
+  bool IsCutMarker(Integer Index) const;
 };
 
 } // namespace midebug

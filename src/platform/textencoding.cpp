@@ -72,20 +72,18 @@ void AppendUTF8(std::string& Text, uint32_t CodePoint) {
   }
 }
 
+/// Appends the Windows-1252 character of Byte.
+void AppendAnsi(std::string& Text, unsigned char Byte) {
+  AppendUTF8(Text, Byte >= 0x80 && Byte < 0xA0 ? Windows1252High[Byte - 0x80] : Byte);
+}
+
 } // namespace
 
 std::string AnsiToUTF8(std::string_view Bytes) {
   std::string Text;
   Text.reserve(Bytes.size() + Bytes.size() / 4);
-  for (const char Byte : Bytes) {
-    const auto Value = static_cast<unsigned char>(Byte);
-    if (Value < 0x80)
-      Text += Byte;
-    else if (Value < 0xA0)
-      AppendUTF8(Text, Windows1252High[Value - 0x80]);
-    else
-      AppendUTF8(Text, Value);
-  }
+  for (const char Byte : Bytes)
+    AppendAnsi(Text, static_cast<unsigned char>(Byte));
   return Text;
 }
 
@@ -119,8 +117,7 @@ std::string DecodeUTF8OrAnsi(std::string_view Bytes) {
       Next += Length;
       continue;
     }
-    Text += AnsiToUTF8(std::string_view(reinterpret_cast<const char*>(Next), 1));
-    ++Next;
+    AppendAnsi(Text, *Next++);
   }
   return Text;
 }

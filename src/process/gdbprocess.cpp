@@ -61,9 +61,9 @@ static bool DebuggerOnThisMachine(TGDBKernel& Kernel) {
 TGDBProcess::TGDBProcess(const TIntfPtr<IGDBProcessListener>& Listener, const std::string& RemoteProfile,
                          const std::string& LauncherPath, Integer Pid, const std::string& CommandFile,
                          TGDBLanguage Language, TGDBCPU CPU, const std::string& Platform)
-    : FKernel(MakeKernel(RemoteProfile, LauncherPath, Pid, CommandFile, Platform)), FLanguage(Language), FCPUType(CPU),
+    : FKernel(MakeKernel(RemoteProfile, LauncherPath, Pid, CommandFile, Platform)), FLanguage(Language),
       FRequests(*FKernel, CPU, Platform, FAlive, FResuming, [this] { NotifyFatalError(); }),
-      FTerminal([this](std::function<void()> Delivery) { DeferIfLive(std::move(Delivery)); },
+      FTerminal(FDeferIfLive,
                 [this](const std::string& Output) {
                   if (FProcessListener)
                     FProcessListener->LogEvent(CreateUnknownLogEvent(Output));
@@ -158,7 +158,7 @@ void TGDBProcess::SendStartupSettings() {
     else
       GdbSet("mi-timings-enabled", "off");
   }
-  if (FCPUType == gcIA32 || FCPUType == gcAMD64) {
+  if (CPU() == gcIA32 || CPU() == gcAMD64) {
     if (LLDB)
       SettingsSet("target.x86-disassembly-flavor", "intel");
     else

@@ -189,7 +189,7 @@ private:
 
   TIntfPtr<IGDBProcessListener> FProcessListener;
   std::atomic<TGDBLanguage> FLanguage;
-  const TGDBCPU FCPUType;
+  const TProgramTerminal::TDefer FDeferIfLive{[this](std::function<void()> Run) { DeferIfLive(std::move(Run)); }};
   std::string FEndOfLineMarker;
   TGDBRequestEngine FRequests;
   TGDBModuleTable FModules;

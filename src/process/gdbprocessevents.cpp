@@ -186,7 +186,7 @@ void TGDBProcess::NotifyModuleLoaded(const TGDBModule& Module) {
   ForgetLineAddresses();
   if (Module.EntryPoint != 0)
     LowerBaseAddress(FBaseAddress, Module.BaseAddress, true);
-  FModuleLoadedPending.Raise(Module, [this](auto Delivery) { DeferIfLive(std::move(Delivery)); },
+  FModuleLoadedPending.Raise(Module, FDeferIfLive,
                              [this](const TGDBModule& Loaded) {
                                FModules.SetCurrent(Loaded);
                                if (FProcessListener)
@@ -196,7 +196,7 @@ void TGDBProcess::NotifyModuleLoaded(const TGDBModule& Module) {
 
 void TGDBProcess::NotifyModuleUnLoaded(const TGDBModule& Module) {
   ForgetLineAddresses();
-  FModuleUnLoadedPending.Raise(Module, [this](auto Delivery) { DeferIfLive(std::move(Delivery)); },
+  FModuleUnLoadedPending.Raise(Module, FDeferIfLive,
                                [this](const TGDBModule& Unloaded) {
                                  if (FProcessListener)
                                    FProcessListener->ModuleUnLoaded(Unloaded);
