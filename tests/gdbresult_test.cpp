@@ -5,11 +5,8 @@
 
 #include <gtest/gtest.h>
 
-#include <algorithm>
 #include <atomic>
-#include <set>
 #include <string>
-#include <vector>
 
 namespace midebug {
 namespace {
