@@ -39,6 +39,13 @@ TEST_F(MemoryInC, ReadsGlobalAndStackBytesAndOnlyReadableOnes) {
   EXPECT_EQ(Process->GetMemory(AddressOf("&pattern"), Buffer, -1), -1);
   EXPECT_EQ(Process->GetMemory(AddressOf("&pattern"), Buffer, 0), 0);
 
+  // A read that starts before the program's first page: GDB answers with
+  // the bytes after the gap, which are not the bytes asked for.
+  const UInt64 FirstPage = (AddressOf("&main") & ~UInt64{0xfff}) - 0x1000;
+  if (Process->GetMemory(FirstPage - 1, Buffer, 1) == -1) {
+    EXPECT_EQ(Process->GetMemory(FirstPage - 4, Buffer, 8), 0);
+  }
+
   // The program's last writable page ends where nothing is mapped: a read
   // across its end gives only the bytes before it.
   const UInt64 PageEnd = (AddressOf("&pattern") | 0xfff) + 1;
@@ -192,6 +199,65 @@ TEST_F(MemoryInOtherLanguages, CursorWalksAndMemoryReadsAtTheStop) {
     }
     EXPECT_EQ(Read(PC, 16).size(), 16u) << Case.Program;
   }
+}
+
+/// The same services on LLDB's MI front end, whose forms differ: a byte
+/// range to disassemble, "memory write" and "register write", whose
+/// refusals come as an error line before a plain done record.
+class MemoryOnLLDB : public test::StoppedProgram {
+protected:
+  void SetUp() override {
+    std::string WhyNot;
+    LLDB = test::LLDBMIPath(WhyNot);
+    if (LLDB.empty())
+      GTEST_SKIP() << WhyNot;
+    StoppedProgram::SetUp();
+    ASSERT_NO_FATAL_FAILURE(Launch(test::Debuggee("memory"), glC, {"inspect_stack"}, LLDB));
+  }
+  std::string LLDB;
+};
+
+TEST_F(MemoryOnLLDB, MemoryCursorAndRegisterWritesWork) {
+  const UInt64 Pattern = AddressOf("&pattern");
+  EXPECT_EQ(Read(Pattern, 64), Counting(0, 64));
+  const Integer NewValue = 42;
+  EXPECT_EQ(Process->SetMemory(AddressOf("&shown"), &NewValue, sizeof NewValue), 4);
+  EXPECT_EQ(Read(AddressOf("&shown"), 4), (std::vector<Byte>{42, 0, 0, 0}));
+  EXPECT_EQ(Process->SetMemory(0, &NewValue, sizeof NewValue), -1) << "LLDB's error line is the refusal";
+
+  const UInt64 PC = Process->GetSuspendedLocation().Address;
+  const TIntfPtr<IGDBDisassemble> Cursor = Process->GetDisassembler();
+  UInt64 Address = 0;
+  Cursor->ToAddress(PC, Address);
+  EXPECT_EQ(Address, PC);
+  for (int Step = 0; Step < 60; ++Step) {
+    UInt64 Next = 0;
+    Cursor->GetNextAddress(Next);
+    ASSERT_GT(Next, Address);
+    ASSERT_TRUE(Cursor->IsValid());
+    Address = Next;
+  }
+
+  const TIntfPtr<IGDBThread> Thread = Process->GetThread(Process->GetSuspendedThreadId());
+  TUInt64Array General;
+  UInt64 Stop = 0;
+  ASSERT_TRUE(Thread->GetRegisters(General, Stop));
+  EXPECT_EQ(General[16], PC);
+  TUInt64Array NewGeneral = General;
+  NewGeneral[9] = 0x1234; // r10: free for the callee to clobber
+  EXPECT_TRUE(Thread->SetRegisters(General, NewGeneral));
+  TXMMRegValueArray XMM;
+  ASSERT_TRUE(Thread->GetXMMRegisters(XMM));
+  TXMMRegValueArray NewXMM = XMM;
+  std::iota(std::begin(NewXMM[3].ByteReg), std::end(NewXMM[3].ByteReg), Byte{0x30});
+  EXPECT_TRUE(Thread->SetXMMRegisters(XMM, NewXMM));
+
+  TUInt64Array GeneralBack;
+  ASSERT_TRUE(Thread->GetRegisters(GeneralBack, Stop));
+  EXPECT_EQ(GeneralBack[9], 0x1234u);
+  TXMMRegValueArray XMMBack;
+  ASSERT_TRUE(Thread->GetXMMRegisters(XMMBack));
+  EXPECT_EQ(std::vector<Byte>(XMMBack[3].ByteReg, XMMBack[3].ByteReg + 16), Counting(0x30, 16));
 }
 
 } // namespace

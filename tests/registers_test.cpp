@@ -198,5 +198,19 @@ TEST_F(RegistersInPascal, VectorAndX87WritesTakeEffectInAPascalFrame) {
   EXPECT_EQ(Comparison.FValue, "true") << "GDB speaks Pascal again";
 }
 
+TEST(RegistersOnTheFake, AFailedListFallsBackToSingleReadsAndFailuresReadAsZero) {
+  SetMainThread();
+  test::TFakeOnPath Fake("gdb", "registers-single-reads.script");
+  TIntfPtr<test::TTestListener> Listener{new test::TTestListener};
+  TIntfPtr<IGDBProcess> Process = TGDBProcessManager::CreateProcess(Listener, "/work/prog", "", "", "local",
+                                                                    "Linux64", glC, gcIA32, "gdb");
+  TGDBRegisterIds& Registers = static_cast<TGDBProcess*>(Process.get())->Registers();
+  TUInt64Array Values;
+  ASSERT_TRUE(Registers.GetRegisters(Values)) << "one single read succeeded";
+  TUInt64Array Expected(16, 0);
+  Expected[2] = 0xc0ffee;
+  EXPECT_EQ(Values, Expected);
+}
+
 } // namespace
 } // namespace midebug

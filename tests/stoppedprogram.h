@@ -29,9 +29,8 @@ public:
   /// the first stop.
   void Launch(const std::string& Program, TGDBLanguage Language, const std::vector<std::string>& Locations,
               const std::string& Debugger = "gdb") {
-    const bool Local = Debugger == "gdb";
-    Process = TGDBProcessManager::CreateProcess(Listener, Program, "", "", Local ? "local" : "", "Linux64",
-                                                Language, gcAMD64, Debugger);
+    Process = TGDBProcessManager::CreateProcess(Listener, Program, "", "", "local", "Linux64", Language, gcAMD64,
+                                                Debugger);
     ASSERT_TRUE(Process);
     for (const std::string& Location : Locations)
       ASSERT_TRUE(Core().ProcessAsyncRequest("-break-insert " + Location));
