@@ -62,6 +62,14 @@ TEST_F(LLDBOnLinux, WithoutAProfileALinuxTargetTakesNoAndroidRoute) {
   EXPECT_TRUE(Listener->HasCall("Exited(3,)"));
 }
 
+TEST_F(LLDBOnLinux, ALaunchRefusedBeforeAnyProcessEndsAtOnceWithTheReason) {
+  const test::TScopedEnv NoServer("LLDB_DEBUGSERVER_PATH", Scratch.Path() + "/no-lldb-server");
+  Launch("exitthree");
+  Process->Run();
+  ASSERT_TRUE(Listener->PumpUntilCall("Exited("));
+  EXPECT_TRUE(Listener->HasCallContaining("unable to locate lldb-server"));
+}
+
 TEST_F(LLDBOnLinux, EveryThreadOfAPausedProgramIsStopped) {
   Launch("idlers");
   Process->Run();
