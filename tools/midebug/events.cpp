@@ -2,6 +2,8 @@
 
 #include "session.h"
 
+#include <regex>
+
 namespace midebug::cli {
 
 // --- The listener --------------------------------------------------------------
@@ -113,15 +115,22 @@ std::string LogKindWord(TGDBEvent Event) {
   }
 }
 
-/// GDB's own notes on threads and on the program's end, which the session
-/// reports in its own words.
-bool IsDebuggerChatter(const std::string& Text) {
-  static const char* const Prefixes[] = {"[New Thread ", "[Thread ", "[New LWP ", "[LWP ", "[Inferior ",
-                                         "[Switching to ", "[Thread debugging using ", "Using host libthread_db"};
+/// GDB's own notes on threads, stops and the program's end, which the
+/// session reports in its own words: its banner-free console, as a person
+/// reads it.
+bool IsDebuggerChatter(const std::string& Line) {
+  static const char* const Prefixes[] = {
+      "[New Thread ", "[Thread ", "[New LWP ", "[LWP ", "[Inferior ", "[Switching to ", "[Thread debugging using ",
+      "Using host libthread_db", "Program received signal ", "Program terminated with signal ",
+      "The program no longer exists.", "Run till exit from ", "Continuing.", "Starting program: ", "Breakpoint ",
+      "Temporary breakpoint ", "Thread "};
   for (const char* Prefix : Prefixes)
-    if (Text.starts_with(Prefix))
+    if (Line.starts_with(Prefix))
       return true;
-  return false;
+  // The frame and source line GDB shows at a stop: "0x... in f () at f.c:8",
+  // "f (a=1) at f.c:8", "8       text".
+  static const std::regex StopEcho(R"(^((0x[0-9a-f]+ in )?\S+ \(.*\)( at \S+:[0-9]+| from \S+)?|[0-9]+(\t|   ).*)$)");
+  return Line.empty() || std::regex_match(Line, StopEcho);
 }
 
 std::string SignalWords(const std::string& Name, const std::string& Description) {
@@ -268,27 +277,34 @@ void TCliSession::OnException(Integer ThreadId, const TGDBException& Exception) 
 }
 
 void TCliSession::OnLog(const TGDBLogEvent& Event) {
-  std::string Data = Event.Data;
-  const bool Console = Event.Event == etConsole;
-  if (Console) {
-    // GDB's line ends arrive as blanks.
-    Data.erase(Data.find_last_not_of(' ') + 1);
-    if (IsDebuggerChatter(Data))
-      return;
+  if (Event.Event == etConsole) {
+    // GDB writes a console line in pieces: whole lines are reported.
+    FConsoleText += Event.Data;
+    for (size_t End = FConsoleText.find('\n'); End != std::string::npos; End = FConsoleText.find('\n')) {
+      const std::string Line = FConsoleText.substr(0, End);
+      FConsoleText.erase(0, End + 1);
+      OnConsoleLine(Line);
+    }
+    return;
   }
-  nlohmann::json Object = {{"event", "output"}, {"kind", LogKindWord(Event.Event)}, {"text", Data}};
+  nlohmann::json Object = {{"event", "output"}, {"kind", LogKindWord(Event.Event)}, {"text", Event.Data}};
   if (Event.ThreadId >= 0)
     Object["thread"] = Event.ThreadId;
-  std::string Text = Data;
-  // The debugger's banner and start-up chatter: kept for tools, left out of
-  // the text a person reads.
-  if (FQuietConsole && Console)
-    Text.clear();
-  else if (Event.Event == etError)
+  std::string Text = Event.Data;
+  if (Event.Event == etError)
     Text = "[debugger error] " + Text;
   else if (Event.Event == etInternal)
     Text = "[debugger] " + Text;
   FOutput.Emit(Object, Text);
+}
+
+void TCliSession::OnConsoleLine(const std::string& Line) {
+  if (IsDebuggerChatter(Line))
+    return;
+  // The debugger's banner and start-up chatter: kept for tools, left out of
+  // the text a person reads.
+  FOutput.Emit({{"event", "output"}, {"kind", LogKindWord(etConsole)}, {"text", Line}},
+               FQuietConsole ? "" : Line);
 }
 
 void TCliSession::OnInternalError(const std::string& Message) {

@@ -165,6 +165,7 @@ void TCliSession::Load(TGDBLanguage Language, TGDBCPU CPU) {
                                                std::filesystem::current_path().string(), FOptions.Profile,
                                                FOptions.Platform, Language, CPU, FOptions.Debugger);
   FState = TRunState::Loaded;
+  FQuietConsole = true;
   FEnding = TEnding::None;
   FThreads.clear();
   FCurrentThread = -1;
@@ -330,7 +331,6 @@ void TCliSession::ResumeAndWait(const std::string& Name, const std::function<voi
   // Counted before resuming, so that a stop reported during the resuming
   // call itself is not missed.
   const uint64_t Before = FStopCount;
-  FQuietConsole = false;
   Resume();
   if (!FWaitForStops) {
     // The prompt comes back at once; the stop is printed when it comes.

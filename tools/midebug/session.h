@@ -144,6 +144,8 @@ private:
   /// The source text line under Location, indented, or empty.
   std::string SourceText(const TGDBLocation& Location);
   void KeepLog();
+  /// One whole line of debugger console text.
+  void OnConsoleLine(const std::string& Line);
 
   const TCliOptions& FOptions;
   TCliOutput& FOutput;
@@ -172,6 +174,8 @@ private:
   /// Debugger console text is left out of the text form until the program
   /// starts or the attach stop: the debugger's banner and start-up chatter.
   bool FQuietConsole = true;
+  /// Console text received after its last line break.
+  std::string FConsoleText;
   /// The debugger logs present before start-up, so that the new one is found.
   std::set<std::string> FLogsBefore;
   std::string FLogDir;
