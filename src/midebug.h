@@ -2,10 +2,11 @@
 /// \file
 /// The boundary an IDE includes: the process manager that creates and
 /// attaches debugged processes, the interfaces and records they are driven
-/// through, the IDE's service registry (remote profiles), and the delivery
+/// through with the register tables their values follow, the IDE's service registry (remote profiles), and the delivery
 /// of events on the IDE's main thread.
 
 #include "kernel/ideservices.h"
+#include "mi/gdbregisters.h"
 #include "platform/mainthread.h"
 #include "process/gdbinterfaces.h"
 #include "process/gdbprocessmanager.h"

@@ -100,6 +100,14 @@ private:
   void CmdQuit(const std::string& Name, const std::vector<std::string>& Arguments);
   void CmdHelp(const std::string& Name, const std::vector<std::string>& Arguments);
 
+  // --- Memory, disassembly and registers (memorycommands.cpp) -------------
+  void CmdExamine(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdWrite(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdDisassemble(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdInfoRegisters(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdSetRegister(const std::string& Name, const std::vector<std::string>& Arguments);
+  // --- End of memory, disassembly and registers ----------------------------
+
   /// True when the program can be resumed or stepped; otherwise prints why.
   bool RequireStopped(const std::string& Name);
   /// The thread commands act on, or null with the reason printed.
