@@ -6,6 +6,7 @@
 #include <cstdlib>
 #include <filesystem>
 #include <sstream>
+#include <string_view>
 
 namespace midebug::cli {
 
@@ -91,6 +92,13 @@ const std::vector<TCliSession::TCommandEntry>& TCliSession::Commands() {
       {"detach", &TCliSession::CmdDetach, 0, "detach", "let the program go on without the debugger"},
       {"quit", &TCliSession::CmdQuit, 0, "quit",
        "end the session (a launched program is killed, an attached one detached)"},
+      {"x", &TCliSession::CmdExamine, 2, "x ADDRESS [COUNT]", "COUNT bytes of memory at ADDRESS (64), in hex and text"},
+      {"write", &TCliSession::CmdWrite, 2, "write ADDRESS HEXBYTES", "write bytes (\"90c3\") to memory at ADDRESS"},
+      {"disassemble", &TCliSession::CmdDisassemble, 2, "disassemble [ADDRESS] [COUNT]",
+       "COUNT instructions (20) from ADDRESS, by default from the start of the current function"},
+      {"info registers", &TCliSession::CmdInfoRegisters, 1, "info registers [general|fpu|sse|NAME]",
+       "the registers of the current thread"},
+      {"set register", &TCliSession::CmdSetRegister, 2, "set register NAME VALUE", "write a register"},
       {"help", &TCliSession::CmdHelp, 0, "help", "this list"},
   };
   return Table;
@@ -179,18 +187,24 @@ bool TCliSession::Execute(const std::string& Line) {
   const std::string Name = Words.front();
   Words.erase(Words.begin());
   for (const TCommandEntry& Entry : Commands()) {
-    if (Name != Entry.Name)
+    // A command of two words ("info registers") takes the second as well.
+    const std::string_view EntryName = Entry.Name;
+    const size_t Blank = EntryName.find(' ');
+    if (EntryName.substr(0, Blank) != Name ||
+        (Blank != std::string_view::npos && (Words.empty() || EntryName.substr(Blank + 1) != Words.front())))
       continue;
+    if (Blank != std::string_view::npos)
+      Words.erase(Words.begin());
     if (Words.size() > Entry.MaxArguments) {
-      FOutput.Error(Name, Entry.MaxArguments == 0 ? "'" + Name + "' takes no arguments"
-                                                  : "usage: " + std::string(Entry.Usage));
+      FOutput.Error(Entry.Name, Entry.MaxArguments == 0 ? "'" + std::string(Entry.Name) + "' takes no arguments"
+                                                        : "usage: " + std::string(Entry.Usage));
       return true;
     }
     try {
-      (this->*Entry.Handler)(Name, Words);
+      (this->*Entry.Handler)(Entry.Name, Words);
     } catch (const std::exception& Error) {
       // The library raises at its boundary when the debugger fails.
-      FOutput.Error(Name, Error.what());
+      FOutput.Error(Entry.Name, Error.what());
     }
     return !FQuit;
   }

@@ -112,6 +112,14 @@ private:
   void CmdQuit(const std::string& Name, const std::vector<std::string>& Arguments);
   void CmdHelp(const std::string& Name, const std::vector<std::string>& Arguments);
 
+  // --- Memory, disassembly and registers (memorycommands.cpp) -------------
+  void CmdExamine(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdWrite(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdDisassemble(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdInfoRegisters(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdSetRegister(const std::string& Name, const std::vector<std::string>& Arguments);
+  // --- End of memory, disassembly and registers ----------------------------
+
   /// Has the debugger load the program (again); raises when it cannot.
   void Load(TGDBLanguage Language, TGDBCPU CPU);
   /// True when the program can be resumed or stepped; otherwise prints why.
