@@ -2,11 +2,13 @@
 /// \file
 /// The boundary an IDE includes: the process manager that creates and
 /// attaches debugged processes, the interfaces and records they are driven
-/// through, the IDE's service registry (remote profiles), and the delivery
-/// of events on the IDE's main thread.
+/// through, the IDE's service registry (remote profiles), the delivery of
+/// events on the IDE's main thread, and the host's own standard streams for
+/// a host that speaks a protocol over them.
 
 #include "kernel/ideservices.h"
 #include "platform/mainthread.h"
+#include "platform/standardstreams.h"
 #include "process/gdbinterfaces.h"
 #include "process/gdbprocessmanager.h"
 #include "process/programarguments.h"
