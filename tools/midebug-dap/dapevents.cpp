@@ -194,10 +194,11 @@ void TDapSession::OnLog(const TGDBLogEvent& Event) {
     Output("stdout", Event.Data);
     return;
   }
-  // The debugger's own lines come without their line break.
+  // The debugger's own lines come with their line break turned to a blank.
   std::string Text = Event.Data;
-  if (Text.back() != '\n')
-    Text += '\n';
+  while (!Text.empty() && (Text.back() == ' ' || Text.back() == '\n'))
+    Text.pop_back();
+  Text += '\n';
   Output("console", Text);
 }
 

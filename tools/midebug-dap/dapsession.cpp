@@ -449,18 +449,20 @@ void TDapSession::End(std::optional<bool> TerminateDebuggee) {
   if (FProcess) {
     try {
       const bool Kill = TerminateDebuggee.value_or(!FAttached);
-      const bool Alive = FState == TProgramState::Stopped || FState == TProgramState::Running;
+      const TProgramState Before = FState;
+      const bool Alive = Before == TProgramState::Stopped || Before == TProgramState::Running;
       if (Alive && !Kill) {
         // The debugger can only let a stopped program go.
-        if (FState == TProgramState::Running) {
+        if (Before == TProgramState::Running) {
           FProcess->Pause();
-          PumpUntilGone(EndWait);
+          PumpWhile(Before, EndWait);
         }
         FProcess->Detach();
         FState = TProgramState::Detached;
-      } else if (Alive || FState == TProgramState::Loaded) {
+      } else if (Alive || Before == TProgramState::Loaded) {
+        // The exit may be reported while Terminate still runs.
         FProcess->Terminate();
-        PumpUntilGone(EndWait);
+        PumpWhile(Before, EndWait);
       }
     } catch (const std::exception& Error) {
       Output("console", std::string("midebug-dap: ") + Error.what() + "\n");
@@ -473,10 +475,9 @@ void TDapSession::End(std::optional<bool> TerminateDebuggee) {
   FFinished = true;
 }
 
-void TDapSession::PumpUntilGone(std::chrono::milliseconds Limit) {
+void TDapSession::PumpWhile(TProgramState State, std::chrono::milliseconds Limit) {
   const auto Deadline = std::chrono::steady_clock::now() + Limit;
-  const TProgramState Before = FState;
-  while (FState == Before && std::chrono::steady_clock::now() < Deadline)
+  while (FState == State && std::chrono::steady_clock::now() < Deadline)
     WaitAndProcess(PumpSlice);
 }
 
@@ -589,7 +590,7 @@ TDapReply TDapSession::Threads(TDapArguments& /*Arguments*/) {
     if (Stopped)
       if (TIntfPtr<IGDBThread> Thread = FProcess->GetThread(Id); Thread && Thread->GetId() == Id)
         Name = Thread->GetName();
-    List.push_back({{"id", Id}, {"name", Name.empty() ? "Thread " + std::to_string(Id) : Name}});
+    List.push_back({{"id", Id}, {"name", "Thread " + std::to_string(Id) + (Name.empty() ? "" : " (" + Name + ")")}});
   }
   return TDapReply::Ok({{"threads", List}});
 }

@@ -8,6 +8,7 @@
 
 #include <nlohmann/json.hpp>
 
+#include <chrono>
 #include <optional>
 #include <set>
 #include <string>
@@ -161,8 +162,9 @@ private:
   std::string NotStoppedReason() const;
   /// Steps the thread the request names.
   TDapReply Step(TDapArguments& Arguments, void (IGDBThread::*Line)(), void (IGDBThread::*Instruction)());
-  /// Pumps the main-thread queue until the program is gone or Limit passes.
-  void PumpUntilGone(std::chrono::milliseconds Limit);
+  /// Pumps the main-thread queue while the program stays in State, at most
+  /// Limit.
+  void PumpWhile(TProgramState State, std::chrono::milliseconds Limit);
   Integer ClientLine(Integer Line) const { return FLinesStartAt1 ? Line : Line - 1; }
   Integer FrameHandle(Integer ThreadId, Integer Level);
 
