@@ -105,7 +105,14 @@ std::string Described(const std::string& Name, const std::string& Desc) {
 
 } // namespace
 
+bool TDapSession::ProgramGone() const {
+  return FState == TProgramState::Exited || FState == TProgramState::Detached || FState == TProgramState::Lost;
+}
+
 void TDapSession::OnSuspended(Integer ThreadId) {
+  // A report queued before the program's end arrives after it.
+  if (ProgramGone())
+    return;
   FState = TProgramState::Stopped;
   FThreads.insert(ThreadId);
   if (FAttached && FEntryPending && !FStopAtEntry) {
@@ -135,6 +142,8 @@ void TDapSession::OnSuspended(Integer ThreadId) {
 }
 
 void TDapSession::OnResumed(Integer ThreadId) {
+  if (ProgramGone())
+    return;
   FState = TProgramState::Running;
   FFrames.clear();
   SendEvent("continued", {{"threadId", ThreadId}, {"allThreadsContinued", true}});

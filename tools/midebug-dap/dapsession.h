@@ -165,6 +165,8 @@ private:
   /// Pumps the main-thread queue while the program stays in State, at most
   /// Limit.
   void PumpWhile(TProgramState State, std::chrono::milliseconds Limit);
+  /// True once the program has exited, was let go or the debugger is lost.
+  bool ProgramGone() const;
   Integer ClientLine(Integer Line) const { return FLinesStartAt1 ? Line : Line - 1; }
   Integer FrameHandle(Integer ThreadId, Integer Level);
 
