@@ -115,3 +115,47 @@ test('attach catches a running program, and disconnect lets it go on', async () 
     client.stopAdapter();
   }
 });
+
+test('in the client\'s terminal the program stops at its entry and reads what the user types', async () => {
+  const client = await s.startClient();
+  let terminal = null;
+  // Play the client's terminal: run what the adapter asks for, with a pipe
+  // for the keyboard, and answer the request.
+  const dispatch = client.dispatch.bind(client);
+  client.dispatch = (body) => {
+    const message = JSON.parse(body);
+    if (message.type !== 'request' || message.command !== 'runInTerminal')
+      return dispatch(body);
+    const [program, ...args] = message.arguments.args;
+    terminal = spawn(program, args, { cwd: message.arguments.cwd, stdio: ['pipe', 'pipe', 'inherit'] });
+    terminal.output = '';
+    terminal.stdout.on('data', (data) => { terminal.output += data; });
+    const response = { type: 'response', seq: 0, request_seq: message.seq, command: message.command, success: true,
+                       body: { processId: terminal.pid } };
+    const json = JSON.stringify(response);
+    client.outputStream.write(`Content-Length: ${Buffer.byteLength(json)}\r\n\r\n${json}`);
+  };
+  try {
+    const stopped = client.waitForEvent('stopped');
+    const initialized = client.waitForEvent('initialized');
+    await client.initializeRequest({ adapterID: 'midebug', supportsRunInTerminalRequest: true });
+    await initialized;
+    await Promise.all([client.launchRequest({ program: s.debuggee('terminal'), args: ['read'], stopAtEntry: true }),
+                       client.configurationDoneRequest()]);
+    const entry = (await stopped).body;
+    assert.equal(entry.reason, 'entry');
+    const frame = await s.topFrame(client, entry.threadId);
+    assert.equal(frame.source.path, s.source('terminal.c'));
+
+    const exited = client.waitForEvent('exited');
+    await client.continueRequest({ threadId: entry.threadId });
+    terminal.stdin.write('typed by the user\n');
+    terminal.stdin.end();
+    assert.equal((await exited).body.exitCode, 0);
+    await s.exitOf(terminal);
+    assert.equal(terminal.output, 'waiting for input\ngot:typed by the user\n');
+  } finally {
+    await client.stop();
+    terminal?.kill('SIGKILL');
+  }
+});

@@ -115,12 +115,10 @@ void TDapSession::OnSuspended(Integer ThreadId) {
     return;
   FState = TProgramState::Stopped;
   FThreads.insert(ThreadId);
-  if (FAttached && FEntryPending && !FStopAtEntry) {
+  if (FHoldAttachStop) {
     // The stop that attaching caused: the client sees the program go on.
-    if (FConfigured) {
-      FEntryPending = false;
-      FProcess->Resume();
-    }
+    FAttachStopSeen = true;
+    StartWhenReady();
     return;
   }
   nlohmann::json Body = {{"threadId", ThreadId}, {"allThreadsStopped", true}};

@@ -18,6 +18,8 @@ namespace {
 constexpr std::chrono::milliseconds EndWait(5000);
 /// One pump of the main-thread queue while the session waits.
 constexpr std::chrono::milliseconds PumpSlice(20);
+/// How long a launch waits for the client's terminal to start the stand-in.
+constexpr std::chrono::seconds TerminalWait(30);
 /// Frames a stack trace request without "levels" gets.
 constexpr Integer DefaultLevels = 1000;
 
@@ -183,6 +185,10 @@ void TDapSession::HandleMessage(const std::string& Body) {
   const auto Type = Message.find("type");
   if (Type == Message.end() || *Type != "request") {
     // Responses to the adapter's own requests and events need no answer.
+    if (Type != Message.end() && *Type == "response" && Message.value("request_seq", -1) == FTerminalRequest &&
+        FTerminalRequest >= 0)
+      FTerminalAnswer = Message.value("success", false) ? TDapReply::Ok()
+                                                         : TDapReply::Refuse(Message.value("message", std::string()));
     if (Type != Message.end() && (*Type == "response" || *Type == "event"))
       return;
     HandleGarbage("a message that is neither request, response nor event");
@@ -263,12 +269,13 @@ void TDapSession::SendEvent(const std::string& Event, nlohmann::json Body) {
   Send(std::move(Message));
 }
 
-void TDapSession::Send(nlohmann::json Message) {
+Integer TDapSession::Send(nlohmann::json Message) {
   Message["seq"] = ++FSequence;
   // Invalid UTF-8 from the program or the debugger is replaced, not thrown.
   const std::string Body = Message.dump(-1, ' ', false, nlohmann::json::error_handler_t::replace);
   // A client that has gone is noticed when its end of the input closes.
   WriteStandardOutput(FrameMessage(Body));
+  return FSequence;
 }
 
 void TDapSession::Output(const std::string& Category, const std::string& Text) {
@@ -283,6 +290,7 @@ TDapReply TDapSession::Initialize(TDapArguments& Arguments) {
   FInitialized = true;
   FLinesStartAt1 = Arguments.Boolean("linesStartAt1").value_or(true);
   FColumnsStartAt1 = Arguments.Boolean("columnsStartAt1").value_or(true);
+  FClientHasTerminal = Arguments.Boolean("supportsRunInTerminalRequest").value_or(false);
   // Exactly what works today; breakpoints, variables and evaluation follow.
   return TDapReply::Ok({
       {"supportsConfigurationDoneRequest", true},
@@ -342,7 +350,8 @@ TDapReply TDapSession::Launch(TDapArguments& Arguments) {
   // The debugger, and through it the program, inherits the adapter's own
   // environment: the variables are set there before it starts; null unsets
   // one.
-  if (const nlohmann::json* Environment = Arguments.Object("env")) {
+  const nlohmann::json* Environment = Arguments.Object("env");
+  if (Environment) {
     for (const auto& [Name, Value] : Environment->items())
       if (Name.empty() || Name.find('=') != std::string::npos || (!Value.is_string() && !Value.is_null()))
         return TDapReply::Refuse("'env' maps variable names to strings (or null to unset one); '" + Name +
@@ -356,6 +365,12 @@ TDapReply TDapSession::Launch(TDapArguments& Arguments) {
   }
   if (!Arguments.Problem().empty())
     return TDapReply::Refuse(Arguments.Problem());
+  const std::string Console = Arguments.String("console").value_or("integratedTerminal");
+  if (!Arguments.Problem().empty())
+    return TDapReply::Refuse(Arguments.Problem());
+  if (FClientHasTerminal && Console != "internalConsole")
+    return LaunchInTerminal(*Program, ProgramArguments, WorkingDir,
+                            Environment ? *Environment : nlohmann::json::object(), Choice);
   const bool ForLLDB = std::filesystem::path(Choice.Debugger).filename().string().find("lldb") != std::string::npos;
   FProcess = TGDBProcessManager::CreateProcess(FListener, *Program,
                                                QuoteProgramArguments(ProgramArguments, ForLLDB), WorkingDir,
@@ -386,7 +401,54 @@ TDapReply TDapSession::Attach(TDapArguments& Arguments) {
   // listener a little later.
   FState = TProgramState::Stopped;
   FStarted = true;
-  FEntryPending = true;
+  FHoldAttachStop = !FStopAtEntry;
+  FEntryPending = FStopAtEntry;
+  StartWhenReady();
+  return TDapReply::Ok();
+}
+
+TDapReply TDapSession::LaunchInTerminal(const std::string& Program, const TStringArray& Arguments,
+                                        const std::string& WorkingDir, const nlohmann::json& Environment,
+                                        const TDebuggerChoice& Choice) {
+  namespace fs = std::filesystem;
+  std::error_code Failure;
+  const fs::path Self = fs::read_symlink("/proc/self/exe", Failure);
+  std::string Error;
+  if (Failure || !FMeeting.Create(Error))
+    return TDapReply::Refuse("cannot prepare the client's terminal for the program: " +
+                             (Failure ? Failure.message() : Error));
+  nlohmann::json CommandLine = {Self.string(), StandInOption, FMeeting.Folder(), Program};
+  for (const std::string& Argument : Arguments)
+    CommandLine.push_back(Argument);
+  FTerminalAnswer.reset();
+  FTerminalRequest = Send({{"type", "request"},
+                           {"command", "runInTerminal"},
+                           {"arguments",
+                            {{"kind", "integrated"},
+                             {"title", fs::path(Program).filename().string()},
+                             {"cwd", WorkingDir},
+                             {"args", CommandLine},
+                             {"env", Environment}}}});
+  // The stand-in leaves its process id once the terminal runs it; requests
+  // that come meanwhile are served as they come.
+  const auto Deadline = std::chrono::steady_clock::now() + TerminalWait;
+  Integer Pid = -1;
+  while (!FEnding && (Pid = FMeeting.StandInPid()) < 0 && std::chrono::steady_clock::now() < Deadline &&
+         (!FTerminalAnswer || FTerminalAnswer->Success))
+    WaitAndProcess(PumpSlice);
+  if (FEnding)
+    return TDapReply::Refuse("the session is ending");
+  if (Pid < 0)
+    return TDapReply::Refuse("the client's terminal did not start the program" +
+                             (FTerminalAnswer && !FTerminalAnswer->Message.empty() ? ": " + FTerminalAnswer->Message
+                                                                                    : std::string()));
+  FProcess = TGDBProcessManager::AttachProcess(FListener, Pid, "Linux64", Choice.Language, HostCPU, Choice.Debugger);
+  FInTerminal = true;
+  FState = TProgramState::Stopped;
+  FStarted = true;
+  FHoldAttachStop = true;
+  // Held by the debugger, the stand-in sees this only when it runs again.
+  FMeeting.Release();
   StartWhenReady();
   return TDapReply::Ok();
 }
@@ -402,12 +464,17 @@ TDapReply TDapSession::ConfigurationDone(TDapArguments& /*Arguments*/) {
 void TDapSession::StartWhenReady() {
   if (!FProcess || !FConfigured)
     return;
-  if (FAttached) {
-    // Attached: the program goes on unless the client asked to see it stop.
-    if (!FStopAtEntry && FState == TProgramState::Stopped && FProcess->GetSuspendedThreadId() >= 0) {
-      FEntryPending = false;
-      FProcess->Resume();
-    }
+  if (FAttached || FInTerminal) {
+    // Attached: the program goes on from the stop that attaching caused,
+    // unless the client asked to see it there.
+    if (!FHoldAttachStop || !FAttachStopSeen)
+      return;
+    FHoldAttachStop = false;
+    // In the terminal the stand-in is still to become the program: its
+    // main is the program's entry.
+    if (FInTerminal && FStopAtEntry)
+      FEntryPending = FProcess->SetRunToMainBreakpoint();
+    FProcess->Resume();
     return;
   }
   if (FStarted)
@@ -448,6 +515,7 @@ void TDapSession::End(std::optional<bool> TerminateDebuggee) {
   FEnding = true;
   if (FProcess) {
     try {
+      // A program in the client's terminal was launched, though attached to.
       const bool Kill = TerminateDebuggee.value_or(!FAttached);
       const TProgramState Before = FState;
       const bool Alive = Before == TProgramState::Stopped || Before == TProgramState::Running;

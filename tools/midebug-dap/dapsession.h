@@ -4,6 +4,7 @@
 /// main thread for one debugged program, and the library's events turned
 /// into the protocol's events.
 
+#include "dapterminal.h"
 #include "midebug.h"
 
 #include <nlohmann/json.hpp>
@@ -143,7 +144,8 @@ private:
   void Dispatch(const nlohmann::json& Request);
   void Respond(const nlohmann::json& Request, const TDapReply& Reply);
   void SendEvent(const std::string& Event, nlohmann::json Body = nullptr);
-  void Send(nlohmann::json Message);
+  /// Sends Message with the next seq, which it returns.
+  Integer Send(nlohmann::json Message);
   void Output(const std::string& Category, const std::string& Text);
 
   /// The debugger's settings shared by launch and attach.
@@ -153,6 +155,11 @@ private:
   };
   std::optional<TDapReply> ReadDebuggerChoice(TDapArguments& Arguments, const std::string& Program,
                                               TDebuggerChoice& Choice);
+  /// Has the client start the program in its terminal through the stand-in,
+  /// and attaches to it there.
+  TDapReply LaunchInTerminal(const std::string& Program, const TStringArray& Arguments,
+                             const std::string& WorkingDir, const nlohmann::json& Environment,
+                             const TDebuggerChoice& Choice);
   /// Starts the program once it is loaded and the client's configuration is
   /// done, whichever comes last.
   void StartWhenReady();
@@ -174,6 +181,18 @@ private:
   TIntfPtr<IGDBProcess> FProcess;
   TProgramState FState = TProgramState::None;
   bool FAttached = false;
+  /// The client offers to start programs in its terminal.
+  bool FClientHasTerminal = false;
+  /// The program runs in the client's terminal (launched, though attached to).
+  bool FInTerminal = false;
+  TStandInMeeting FMeeting;
+  /// The seq of the adapter's runInTerminal request, and the client's answer.
+  Integer FTerminalRequest = -1;
+  std::optional<TDapReply> FTerminalAnswer;
+  /// The stop that attaching caused is kept from the client until the
+  /// configuration is done; set until then, and once it has been seen.
+  bool FHoldAttachStop = false;
+  bool FAttachStopSeen = false;
   bool FInitialized = false;
   bool FConfigured = false;
   bool FStarted = false;

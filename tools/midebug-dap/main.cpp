@@ -4,6 +4,7 @@
 
 #include "dapframing.h"
 #include "dapsession.h"
+#include "dapterminal.h"
 
 #include <chrono>
 #include <cstdio>
@@ -23,7 +24,9 @@ constexpr size_t ReadChunk = 64 * 1024;
 const char* const UsageText =
     "usage: midebug-dap\n"
     "A debug adapter: an editor starts it and speaks the debug adapter protocol\n"
-    "over its standard input and output. See the README for the launch settings.\n";
+    "over its standard input and output. See the README for the launch settings.\n"
+    "(midebug-dap --run-in-terminal FOLDER PROGRAM [ARGUMENTS...] is the stand-in\n"
+    "it has an editor's terminal run for a program.)\n";
 
 /// Reads the client's bytes and hands each message to the main thread. The
 /// only state it shares with the main thread is the delivery queue.
@@ -54,6 +57,8 @@ void ReadClient(TDapSession& Session) {
 } // namespace
 
 int main(int ArgCount, char** Args) {
+  if (ArgCount > 1 && std::strcmp(Args[1], StandInOption) == 0)
+    return RunStandIn(ArgCount, Args);
   if (ArgCount > 1) {
     const bool Help = std::strcmp(Args[1], "--help") == 0 || std::strcmp(Args[1], "-h") == 0;
     std::fputs(UsageText, Help ? stdout : stderr);
