@@ -104,6 +104,7 @@ test('garbage and lying lengths cost only the messages they spoil', async () => 
     adapter.write(adapter.frame([1, 2, 3]));
     adapter.write(Buffer.concat([Buffer.from('Content-Length: 4\r\n\r\n'), Buffer.from([0x22, 0xff, 0xfe, 0x22])]));
     adapter.write(adapter.frame({ seq: 4, type: 'request' }));
+    adapter.write(adapter.frame({ seq: 8, type: 'response', request_seq: 'x', success: 1, message: {} }));
     adapter.write(adapter.frame({ seq: 5, type: 'request', command: 'launch', arguments: 'program' }));
     adapter.write(adapter.frame({ seq: 6, type: 'request', command: 'stackTrace', arguments: { threadId: -3 } }));
     // A request cut across writes still arrives.

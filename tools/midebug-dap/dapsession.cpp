@@ -184,17 +184,26 @@ void TDapSession::HandleMessage(const std::string& Body) {
   FInGarbage = false;
   const auto Type = Message.find("type");
   if (Type == Message.end() || *Type != "request") {
-    // Responses to the adapter's own requests and events need no answer.
-    if (Type != Message.end() && *Type == "response" && Message.value("request_seq", -1) == FTerminalRequest &&
-        FTerminalRequest >= 0)
-      FTerminalAnswer = Message.value("success", false) ? TDapReply::Ok()
-                                                         : TDapReply::Refuse(Message.value("message", std::string()));
-    if (Type != Message.end() && (*Type == "response" || *Type == "event"))
-      return;
-    HandleGarbage("a message that is neither request, response nor event");
+    if (Type != Message.end() && *Type == "response")
+      HandleResponse(Message);
+    // Events from the client need no answer.
+    else if (Type == Message.end() || *Type != "event")
+      HandleGarbage("a message that is neither request, response nor event");
     return;
   }
   Dispatch(Message);
+}
+
+void TDapSession::HandleResponse(const nlohmann::json& Response) {
+  const auto Seq = Response.find("request_seq");
+  if (FTerminalRequest < 0 || Seq == Response.end() || *Seq != FTerminalRequest)
+    return;
+  const auto Success = Response.find("success");
+  const auto Message = Response.find("message");
+  FTerminalAnswer = Success != Response.end() && *Success == true
+                        ? TDapReply::Ok()
+                        : TDapReply::Refuse(Message != Response.end() && Message->is_string() ? Message->get<std::string>()
+                                                                                             : std::string());
 }
 
 void TDapSession::HandleGarbage(const std::string& What) {
@@ -287,10 +296,15 @@ void TDapSession::Output(const std::string& Category, const std::string& Text) {
 TDapReply TDapSession::Initialize(TDapArguments& Arguments) {
   if (FInitialized)
     return TDapReply::Refuse("the session is already initialized");
+  const bool LinesStartAt1 = Arguments.Boolean("linesStartAt1").value_or(true);
+  const bool ColumnsStartAt1 = Arguments.Boolean("columnsStartAt1").value_or(true);
+  const bool ClientHasTerminal = Arguments.Boolean("supportsRunInTerminalRequest").value_or(false);
+  if (!Arguments.Problem().empty())
+    return TDapReply::Refuse(Arguments.Problem());
   FInitialized = true;
-  FLinesStartAt1 = Arguments.Boolean("linesStartAt1").value_or(true);
-  FColumnsStartAt1 = Arguments.Boolean("columnsStartAt1").value_or(true);
-  FClientHasTerminal = Arguments.Boolean("supportsRunInTerminalRequest").value_or(false);
+  FLinesStartAt1 = LinesStartAt1;
+  FColumnsStartAt1 = ColumnsStartAt1;
+  FClientHasTerminal = ClientHasTerminal;
   // Exactly what works today; breakpoints, variables and evaluation follow.
   return TDapReply::Ok({
       {"supportsConfigurationDoneRequest", true},
@@ -436,13 +450,20 @@ TDapReply TDapSession::LaunchInTerminal(const std::string& Program, const TStrin
   while (!FEnding && (Pid = FMeeting.StandInPid()) < 0 && std::chrono::steady_clock::now() < Deadline &&
          (!FTerminalAnswer || FTerminalAnswer->Success))
     WaitAndProcess(PumpSlice);
+  if (FEnding || Pid < 0)
+    FMeeting.Dismiss();
   if (FEnding)
     return TDapReply::Refuse("the session is ending");
   if (Pid < 0)
     return TDapReply::Refuse("the client's terminal did not start the program" +
                              (FTerminalAnswer && !FTerminalAnswer->Message.empty() ? ": " + FTerminalAnswer->Message
                                                                                     : std::string()));
-  FProcess = TGDBProcessManager::AttachProcess(FListener, Pid, "Linux64", Choice.Language, HostCPU, Choice.Debugger);
+  try {
+    FProcess = TGDBProcessManager::AttachProcess(FListener, Pid, "Linux64", Choice.Language, HostCPU, Choice.Debugger);
+  } catch (const std::exception&) {
+    FMeeting.Dismiss();
+    throw;
+  }
   FInTerminal = true;
   FState = TProgramState::Stopped;
   FStarted = true;
@@ -527,7 +548,7 @@ void TDapSession::End(std::optional<bool> TerminateDebuggee) {
         }
         FProcess->Detach();
         FState = TProgramState::Detached;
-      } else if (Alive || Before == TProgramState::Loaded) {
+      } else if (Alive) {
         // The exit may be reported while Terminate still runs.
         FProcess->Terminate();
         PumpWhile(Before, EndWait);
@@ -535,7 +556,8 @@ void TDapSession::End(std::optional<bool> TerminateDebuggee) {
     } catch (const std::exception& Error) {
       Output("console", std::string("midebug-dap: ") + Error.what() + "\n");
     }
-    // Releasing the process stops the debugger.
+    // Releasing the process stops the debugger (and a program loaded but
+    // never started).
     FProcess = nullptr;
     ProcessPending();
   }
@@ -591,6 +613,8 @@ TIntfPtr<IGDBThread> TDapSession::StoppedThread(TDapArguments& Arguments, TDapRe
 
 TDapReply TDapSession::Continue(TDapArguments& Arguments) {
   Arguments.Number("threadId", 0, 0x7fffffff);
+  if (!Arguments.Problem().empty())
+    return TDapReply::Refuse(Arguments.Problem());
   if (!FProcess || FState != TProgramState::Stopped)
     return TDapReply::Refuse(NotStoppedReason());
   FProcess->Resume();
@@ -603,6 +627,8 @@ TDapReply TDapSession::Step(TDapArguments& Arguments, void (IGDBThread::*Line)()
   if (!Thread)
     return Refusal;
   const std::string Granularity = Arguments.String("granularity").value_or("statement");
+  if (!Arguments.Problem().empty())
+    return TDapReply::Refuse(Arguments.Problem());
   if (Granularity != "statement" && Granularity != "line" && Granularity != "instruction")
     return TDapReply::Refuse("'granularity' must be \"statement\", \"line\" or \"instruction\"");
   ((*Thread).*(Granularity == "instruction" ? Instruction : Line))();
@@ -624,6 +650,8 @@ TDapReply TDapSession::StepOut(TDapArguments& Arguments) {
 
 TDapReply TDapSession::Pause(TDapArguments& Arguments) {
   Arguments.Number("threadId", 0, 0x7fffffff);
+  if (!Arguments.Problem().empty())
+    return TDapReply::Refuse(Arguments.Problem());
   if (FProcess && FState == TProgramState::Stopped)
     return TDapReply::Ok();
   if (!FProcess || FState != TProgramState::Running)

@@ -140,6 +140,8 @@ private:
   /// The requests whose library operations are still to come.
   TDapReply NotYetServed(TDapArguments& Arguments);
 
+  /// A response to the adapter's own request.
+  void HandleResponse(const nlohmann::json& Response);
   /// Runs the request's handler and answers it.
   void Dispatch(const nlohmann::json& Request);
   void Respond(const nlohmann::json& Request, const TDapReply& Reply);

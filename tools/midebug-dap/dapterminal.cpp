@@ -46,7 +46,7 @@ int RunStandIn(int ArgCount, char** Args) {
   }
   const auto Deadline = std::chrono::steady_clock::now() + StandInPatience;
   while (!fs::exists(Folder / ReleaseFile, Failure)) {
-    if (std::chrono::steady_clock::now() > Deadline) {
+    if (!fs::exists(Folder / PidFile, Failure) || std::chrono::steady_clock::now() > Deadline) {
       std::fprintf(stderr, "midebug-dap: the debugger did not attach\n");
       return 1;
     }
@@ -58,11 +58,14 @@ int RunStandIn(int ArgCount, char** Args) {
   return 127;
 }
 
-TStandInMeeting::~TStandInMeeting() {
+TStandInMeeting::~TStandInMeeting() { Dismiss(); }
+
+void TStandInMeeting::Dismiss() {
   if (FFolder.empty())
     return;
   std::error_code Ignored;
   fs::remove_all(FFolder, Ignored);
+  FFolder.clear();
 }
 
 bool TStandInMeeting::Create(std::string& Error) {

@@ -32,6 +32,8 @@ public:
   int StandInPid() const;
   /// Tells the stand-in to become the program once it runs again.
   void Release() const;
+  /// Removes the folder: a stand-in still waiting gives up.
+  void Dismiss();
 
 private:
   std::string FFolder;

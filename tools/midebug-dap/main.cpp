@@ -71,8 +71,14 @@ int main(int ArgCount, char** Args) {
   // The reader blocks on the client's input, which may never close; the
   // process ends without waiting for it.
   Reader.detach();
-  while (!Session.Finished())
-    WaitAndProcess(PumpSlice);
+  while (!Session.Finished()) {
+    try {
+      WaitAndProcess(PumpSlice);
+    } catch (const std::exception& Error) {
+      // Whatever a client sends, the adapter stays: the failure is reported.
+      Session.HandleGarbage(std::string("a message it failed on: ") + Error.what());
+    }
+  }
   std::fflush(stderr);
   std::_Exit(0);
 }
