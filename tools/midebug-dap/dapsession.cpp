@@ -40,6 +40,8 @@ std::string HexAddress(UInt64 Address) {
 TGDBLanguage GuessLanguage(const std::string& Program) {
   namespace fs = std::filesystem;
   std::error_code Ignored;
+  if (Program.empty())
+    return glC;
   const fs::path Stem = fs::path(Program).replace_extension();
   for (const char* Pascal : {".pas", ".pp", ".lpr", ".dpr"})
     if (fs::exists(fs::path(Stem).concat(Pascal), Ignored))
@@ -344,7 +346,8 @@ std::optional<TDapReply> TDapSession::ReadDebuggerChoice(TDapArguments& Argument
 TDapReply TDapSession::Launch(TDapArguments& Arguments) {
   if (!FInitialized)
     return TDapReply::Refuse("'initialize' must come first");
-  if (FProcess)
+  // A launch waiting for the client's terminal has a meeting folder.
+  if (FProcess || !FMeeting.Folder().empty())
     return TDapReply::Refuse("this adapter already debugs a program; start another adapter for another");
   const auto Program = Arguments.String("program");
   if (!Program || Program->empty())
@@ -398,7 +401,8 @@ TDapReply TDapSession::Launch(TDapArguments& Arguments) {
 TDapReply TDapSession::Attach(TDapArguments& Arguments) {
   if (!FInitialized)
     return TDapReply::Refuse("'initialize' must come first");
-  if (FProcess)
+  // A launch waiting for the client's terminal has a meeting folder.
+  if (FProcess || !FMeeting.Folder().empty())
     return TDapReply::Refuse("this adapter already debugs a program; start another adapter for another");
   const auto Pid = Arguments.Number("pid", 1, 0x7fffffff);
   if (!Pid)
@@ -406,7 +410,9 @@ TDapReply TDapSession::Attach(TDapArguments& Arguments) {
                                                          : Arguments.Problem());
   FStopAtEntry = Arguments.Boolean("stopAtEntry").value_or(false);
   TDebuggerChoice Choice;
-  if (auto Refusal = ReadDebuggerChoice(Arguments, "/proc/" + std::to_string(*Pid) + "/exe", Choice))
+  std::error_code Unknown;
+  const std::string Program = std::filesystem::read_symlink("/proc/" + std::to_string(*Pid) + "/exe", Unknown);
+  if (auto Refusal = ReadDebuggerChoice(Arguments, Program, Choice))
     return *Refusal;
   FProcess = TGDBProcessManager::AttachProcess(FListener, static_cast<Integer>(*Pid), "Linux64", Choice.Language,
                                                HostCPU, Choice.Debugger);
