@@ -139,9 +139,11 @@ test('each argument, the working directory and the environment reach the program
   }
 });
 
-test('a program that runs without stopping reports its output and exit code', async () => {
+test('a program that runs without stopping reports its output, its modules and exit code', async () => {
   const client = await s.startClient();
   try {
+    const modules = [];
+    client.on('module', (event) => modules.push(event.body));
     const exited = client.waitForEvent('exited');
     const terminated = client.waitForEvent('terminated');
     await s.launch(client, { program: s.debuggee('exitthree') });
@@ -149,7 +151,9 @@ test('a program that runs without stopping reports its output and exit code', as
     await terminated;
     await s.waitForOutput(client, 'stdout', 'marker-7781\n');
     // The debugger's own words go to the console, never to the program's output.
+    assert.match(s.outputOf(client, 'console'), /GNU gdb/);
     assert.doesNotMatch(s.outputOf(client, 'stdout'), /GNU gdb/);
+    assert.ok(modules.some((m) => m.reason === 'new' && /libc\.so/.test(m.module.path)), JSON.stringify(modules));
   } finally {
     await client.stop();
   }
