@@ -124,33 +124,6 @@ private:
   dap::TDapFrameReader FReader;
 };
 
-/// GDB on two pipes, answered with blocking reads.
-class TRawGdb : public bench::TRawGdbPipes {
-public:
-  bool Request(const std::string& Command, const std::string& Also = {}) {
-    const std::string Token = std::to_string(++FToken);
-    return Write(Token + Command + "\n") && Await("\n" + Token + "^") && (Also.empty() || Await(Also));
-  }
-  bool Await(const std::string& Text) {
-    char Buffer[4096];
-    for (;;) {
-      const size_t Found = FPending.find(Text);
-      if (Found != std::string::npos) {
-        FPending.replace(0, Found + Text.size(), "\n");
-        return true;
-      }
-      const Int64 BytesRead = Read(Buffer, sizeof Buffer);
-      if (BytesRead <= 0)
-        return false;
-      FPending.append(Buffer, static_cast<size_t>(BytesRead));
-    }
-  }
-
-private:
-  Cardinal FToken = 0;
-  std::string FPending = "\n";
-};
-
 /// The adapter from its start to the stop at main; false when it failed.
 bool AdapterToMain(TDapClient& Client, const std::string& Program, int& ThreadId) {
   if (!Client.Start())
@@ -168,9 +141,8 @@ bool AdapterToMain(TDapClient& Client, const std::string& Program, int& ThreadId
   return true;
 }
 
-bool RawToMain(TRawGdb& Raw, const std::string& Program) {
-  return Raw.Start() && Raw.Await("(gdb) \n") && Raw.Request("-file-exec-and-symbols \"" + Program + "\"") &&
-         Raw.Request("-break-insert -t main") && Raw.Request("-exec-run", "*stopped");
+bool RawToMain(bench::TRawGdbPipes& Raw, const std::string& Program) {
+  return Raw.Start() && Raw.StartProgram(Program, "main");
 }
 
 double Median(std::vector<double> Values) {
@@ -200,7 +172,7 @@ int Run() {
     }
     Begin = TClock::now();
     {
-      TRawGdb Raw;
+      bench::TRawGdbPipes Raw;
       if (!RawToMain(Raw, Program)) {
         std::fprintf(stderr, "dap_bench: GDB did not stop at main\n");
         return 1;
@@ -211,7 +183,7 @@ int Run() {
 
   // (b) Steps, both sessions stopped in the loop 20 frames deep.
   TDapClient Client;
-  TRawGdb Raw;
+  bench::TRawGdbPipes Raw;
   int ThreadId = 0;
   if (!AdapterToMain(Client, Program, ThreadId) || !RawToMain(Raw, Program) || !Raw.Request("-break-insert -t spin") ||
       !Raw.Request("-exec-continue", "*stopped")) {

@@ -3,11 +3,13 @@
 /// The boundary an IDE includes: the process manager that creates and
 /// attaches debugged processes, the interfaces and records they are driven
 /// through, the IDE's service registry (remote profiles), the delivery of
-/// events on the IDE's main thread, and, for a host that speaks a protocol
-/// over its standard streams, those streams and a stand-in process that
-/// becomes the program in a terminal the host does not own.
+/// events on the IDE's main thread, the console services a host program
+/// such as the console debugger needs, and, for a host that speaks a
+/// protocol over its standard streams, those streams and a stand-in process
+/// that becomes the program in a terminal the host does not own.
 
 #include "kernel/ideservices.h"
+#include "platform/hostconsole.h"
 #include "platform/mainthread.h"
 #include "platform/standardstreams.h"
 #include "platform/standinprocess.h"

@@ -131,8 +131,8 @@ test('garbage and lying lengths cost only the messages they spoil', async () => 
   }
 });
 
-test('a client that goes away leaves neither debugger nor program running', async () => {
-  for (const stopFirst of [true, false]) {
+test('a client that goes away, or ends the adapter, leaves neither debugger nor program running', async () => {
+  for (const [how, stopFirst] of [['closes its pipes', true], ['closes its pipes', false], ['sends SIGTERM', false]]) {
     const dir = s.scratchDir();
     const client = await s.startClient(dir);
     const adapter = client._adapterProcess;
@@ -146,12 +146,17 @@ test('a client that goes away leaves neither debugger nor program running', asyn
     }
     assert.ok(running.some((p) => p.includes('gdb')), running.join('\n'));
     assert.ok(running.some((p) => p.includes('sleeper')), running.join('\n'));
-    // As when the client is killed: both its pipes close.
     const exit = s.exitOf(adapter);
-    adapter.stdin.destroy();
-    adapter.stdout.destroy();
-    assert.equal(await exit, 0);
-    assert.deepEqual(await s.leftRunningIn(dir), [], stopFirst ? 'stopped program' : 'running program');
+    if (how === 'sends SIGTERM') {
+      adapter.kill('SIGTERM');
+      assert.equal(await exit, 128 + 15);
+    } else {
+      // As when the client is killed: both its pipes close.
+      adapter.stdin.destroy();
+      adapter.stdout.destroy();
+      assert.equal(await exit, 0);
+    }
+    assert.deepEqual(await s.leftRunningIn(dir), [], `${how}, ${stopFirst ? 'stopped' : 'running'}`);
   }
 });
 

@@ -20,6 +20,9 @@ using namespace midebug::dap;
 
 constexpr std::chrono::milliseconds PumpSlice(250);
 constexpr size_t ReadChunk = 64 * 1024;
+/// The exit code after a terminating signal is this plus its number, as a
+/// shell reports a program the signal ended.
+constexpr int ExitBySignal = 128;
 
 const char* const UsageText =
     "usage: midebug-dap\n"
@@ -65,6 +68,10 @@ int main(int ArgCount, char** Args) {
     return Help ? 0 : 2;
   }
   SetMainThread();
+  // An editor may end the adapter with SIGTERM or SIGHUP, and an interrupt
+  // typed at its terminal may reach it: none of them may end the adapter
+  // before it has let the debugger and the program go.
+  CatchHostSignals();
   // Lives until the process ends: the reader may still post to it.
   static TDapSession Session;
   std::thread Reader(ReadClient, std::ref(Session));
@@ -78,7 +85,10 @@ int main(int ArgCount, char** Args) {
       // Whatever a client sends, the adapter stays: the failure is reported.
       Session.HandleGarbage(std::string("a message it failed on: ") + Error.what());
     }
+    if (TakeHostSignal() == THostSignal::Terminate)
+      Session.HandleClientGone();
   }
   std::fflush(stderr);
-  std::_Exit(0);
+  const int Signal = CaughtTerminationSignal();
+  std::_Exit(Signal != 0 ? ExitBySignal + Signal : 0);
 }
