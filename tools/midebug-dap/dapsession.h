@@ -85,6 +85,9 @@ struct TDapReply {
 /// Where the debugged program is, as the session has learnt from events.
 enum class TProgramState { None, Loaded, Running, Stopped, Exited, Detached, Lost };
 
+/// The adapter's side of one client. Every member runs on the main thread:
+/// requests arrive there as deliveries from the reader, events from the
+/// library, and it alone writes to the client, so no state here is shared.
 class TDapSession {
 public:
   TDapSession();
