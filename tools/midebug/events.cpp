@@ -3,6 +3,7 @@
 #include "session.h"
 
 #include <regex>
+#include <utility>
 
 namespace midebug::cli {
 
@@ -178,6 +179,8 @@ void TCliSession::OnSuspended(Integer ThreadId) {
     Why = "Stopped by signal " + SignalWords(FLastSignal.Name, FLastSignal.Desc);
   }
   FPausing = false;
+  FPauseWhenResumed = false;
+  FResumeConfirmed = true;
   FLastSignal = {};
   Event["reason"] = ReasonWord;
   Event.update(LocationJson(Location));
@@ -193,6 +196,9 @@ void TCliSession::OnSuspended(Integer ThreadId) {
 
 void TCliSession::OnResumed(Integer ThreadId) {
   FState = TRunState::Running;
+  FResumeConfirmed = true;
+  if (std::exchange(FPauseWhenResumed, false))
+    RequestPause();
   FOutput.Emit({{"event", "running"}, {"thread", ThreadId}}, "");
 }
 

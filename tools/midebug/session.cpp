@@ -251,6 +251,9 @@ bool TCliSession::HandleSignals() {
 
 void TCliSession::RequestPause() {
   FPausing = true;
+  // The library ignores a pause until the debugger has said the program
+  // runs: one asked for sooner is asked again then.
+  FPauseWhenResumed = !FResumeConfirmed;
   try {
     FProcess->Pause();
   } catch (const std::exception& Error) {
@@ -331,6 +334,8 @@ void TCliSession::ResumeAndWait(const std::string& Name, const std::function<voi
   // Counted before resuming, so that a stop reported during the resuming
   // call itself is not missed.
   const uint64_t Before = FStopCount;
+  if (Name != "pause")
+    FResumeConfirmed = false;
   Resume();
   if (!FWaitForStops) {
     // The prompt comes back at once; the stop is printed when it comes.
