@@ -179,6 +179,7 @@ void TCliSession::OnSuspended(Integer ThreadId) {
     Why = "Stopped by signal " + SignalWords(FLastSignal.Name, FLastSignal.Desc);
   }
   FPausing = false;
+  FAwaitingMain = false;
   FPauseWhenResumed = false;
   FResumeConfirmed = true;
   FLastSignal = {};
@@ -238,6 +239,10 @@ void TCliSession::OnExited(Integer Code, const std::string& Signal) {
     Event["reason"] = "exited";
     Event["code"] = Code;
     Text = "Program exited with code " + std::to_string(Code) + ".";
+  }
+  if (std::exchange(FAwaitingMain, false) && Ending == TEnding::None) {
+    Event["note"] = "no main function";
+    Text += " It never reached main: the program has no main function.";
   }
   FOutput.Emit(Event, Text);
 }

@@ -420,6 +420,9 @@ void TCliSession::CmdStart(const std::string& Name, const std::vector<std::strin
     FOutput.Error(Name, "the program has no main function; 'run' runs it");
     return;
   }
+  // The debugger accepts a breakpoint on a main it has not found yet, in
+  // case a library brings one: an end before any stop means there was none.
+  FAwaitingMain = true;
   ResumeAndWait(Name, [this] { FProcess->Run(); });
 }
 
@@ -624,6 +627,8 @@ void TCliSession::CmdHelp(const std::string& Name, const std::vector<std::string
     Usage.resize(std::max<size_t>(Usage.size(), 10), ' ');
     Text += "  " + Usage + "  " + Entry.Help + "\n";
   }
+  Text += "While the program runs: pause (or Ctrl-C), kill, detach, threads, quit.\n"
+          "The program's input is empty unless midebug was started with --stdin FILE or --tty DEVICE.\n";
   FOutput.Emit({{"answer", Name}, {"commands", List}}, Text);
 }
 
