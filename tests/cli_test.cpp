@@ -270,6 +270,15 @@ TEST_F(CliTest, CliEndsAreReportedAsTheyHappenAndTheProgramRunsAgain) {
     for (const char* Chatter : {"[New Thread", "[Inferior", "Program terminated"})
       EXPECT_EQ(Run->Output().find(Chatter), std::string::npos) << Run->Output();
 
+  {
+    // A debugger that dies is reported at once, as such.
+    test::TFakeOnPath Fake("gdb", "gdb-dies-on-request.script");
+    const TCliRun Lost = RunCli(Quote(Debuggee("exitthree")), "run\n");
+    const json* Gone = Lost.Event("exited");
+    ASSERT_NE(Gone, nullptr) << Lost.Stdout << Lost.Stderr;
+    EXPECT_EQ((*Gone)["reason"], "debugger-lost") << *Gone;
+  }
+
   const std::string Text = Scratch.WriteFile("notes.txt", "not a program\n");
   const TCliRun Refused = RunCli(Quote(Text), "run\n");
   EXPECT_EQ(Refused.ExitCode, 1);

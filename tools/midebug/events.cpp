@@ -139,6 +139,10 @@ std::string SignalWords(const std::string& Name, const std::string& Description)
   return Words.empty() ? Name : Name + " (" + Words + ")";
 }
 
+/// The code the library gives the end of a launch the debugger refused;
+/// the loss of the debugger comes with another.
+constexpr Integer LaunchRefusedCode = -1;
+
 /// A signal's name is a single word in capitals; the library reports other
 /// texts (the debugger's loss, a refused launch) in the same place.
 bool IsSignalName(const std::string& Text) {
@@ -224,7 +228,7 @@ void TCliSession::OnExited(Integer Code, const std::string& Signal) {
     Event["reason"] = "signal";
     Event["signal"] = Signal;
     Text = "Program ended by signal " + SignalWords(Signal, "") + ".";
-  } else if (!Signal.empty() && Before == TRunState::Loaded) {
+  } else if (!Signal.empty() && Before == TRunState::Loaded && Code == LaunchRefusedCode) {
     FState = TRunState::Exited;
     Event["reason"] = "start-failed";
     Event["message"] = Signal;
