@@ -218,6 +218,13 @@ void TCliSession::End() {
 }
 
 bool TCliSession::EndProgram(TEnding How) {
+  // Both pause the program first, which the library skips while it still
+  // counts the program as stopped: the resume must be under way.
+  const auto Deadline = std::chrono::steady_clock::now() + EndWait;
+  while (FState == TRunState::Running && !FResumeConfirmed && std::chrono::steady_clock::now() < Deadline)
+    WaitAndProcess(PumpSlice);
+  if (FState != TRunState::Running && FState != TRunState::Stopped)
+    return true;
   const uint64_t Before = FStopCount;
   FEnding = How;
   if (How == TEnding::Detach)
@@ -334,7 +341,9 @@ void TCliSession::ResumeAndWait(const std::string& Name, const std::function<voi
   // Counted before resuming, so that a stop reported during the resuming
   // call itself is not missed.
   const uint64_t Before = FStopCount;
-  if (Name != "pause")
+  // The library counts a program it saw stopped as stopped until the
+  // debugger reports it running again; a launch it never counted so.
+  if (FState == TRunState::Stopped)
     FResumeConfirmed = false;
   Resume();
   if (!FWaitForStops) {
