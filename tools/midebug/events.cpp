@@ -166,7 +166,8 @@ void TCliSession::OnSuspended(Integer ThreadId) {
     if (TIntfPtr<IGDBThread> Thread = FProcess->GetThread(ThreadId)) {
       Reason = Thread->GetStopReason();
       Location = Thread->GetCurrentLocation();
-      if (Thread->GetCallCount() > 0)
+      // The frame's call is read only for the text a person reads.
+      if (!FOutput.Json() && Thread->GetCallCount() > 0)
         Header = Thread->GetCallHeader(1);
     }
     if (Location.Source.empty() && Location.Address == 0)
