@@ -232,6 +232,13 @@ void TCliSession::End() {
 }
 
 bool TCliSession::EndProgram(TEnding How) {
+  // Both pause the program first, which the library skips while it still
+  // counts the program as stopped: the resume must be under way.
+  const auto Deadline = std::chrono::steady_clock::now() + EndWait;
+  while (FState == TRunState::Running && !FResumeConfirmed && std::chrono::steady_clock::now() < Deadline)
+    WaitAndProcess(PumpSlice);
+  if (FState != TRunState::Running && FState != TRunState::Stopped)
+    return true;
   const uint64_t Before = FStopCount;
   FEnding = How;
   if (How == TEnding::Detach)
@@ -265,6 +272,9 @@ bool TCliSession::HandleSignals() {
 
 void TCliSession::RequestPause() {
   FPausing = true;
+  // The library ignores a pause until the debugger has said the program
+  // runs: one asked for sooner is asked again then.
+  FPauseWhenResumed = !FResumeConfirmed;
   try {
     FProcess->Pause();
   } catch (const std::exception& Error) {
@@ -345,6 +355,10 @@ void TCliSession::ResumeAndWait(const std::string& Name, const std::function<voi
   // Counted before resuming, so that a stop reported during the resuming
   // call itself is not missed.
   const uint64_t Before = FStopCount;
+  // The library counts a program it saw stopped as stopped until the
+  // debugger reports it running again; a launch it never counted so.
+  if (FState == TRunState::Stopped)
+    FResumeConfirmed = false;
   Resume();
   if (!FWaitForStops) {
     // The prompt comes back at once; the stop is printed when it comes.
@@ -429,6 +443,9 @@ void TCliSession::CmdStart(const std::string& Name, const std::vector<std::strin
     FOutput.Error(Name, "the program has no main function; 'run' runs it");
     return;
   }
+  // The debugger accepts a breakpoint on a main it has not found yet, in
+  // case a library brings one: an end before any stop means there was none.
+  FAwaitingMain = true;
   ResumeAndWait(Name, [this] { FProcess->Run(); });
 }
 
@@ -633,6 +650,8 @@ void TCliSession::CmdHelp(const std::string& Name, const std::vector<std::string
     Usage.resize(std::max<size_t>(Usage.size(), 10), ' ');
     Text += "  " + Usage + "  " + Entry.Help + "\n";
   }
+  Text += "While the program runs: pause (or Ctrl-C), kill, detach, threads, quit.\n"
+          "The program's input is empty unless midebug was started with --stdin FILE or --tty DEVICE.\n";
   FOutput.Emit({{"answer", Name}, {"commands", List}}, Text);
 }
 

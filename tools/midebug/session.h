@@ -175,6 +175,12 @@ private:
   bool FWaitForStops = true;
   /// Set by a pause the session asked for, until the stop it brings.
   bool FPausing = false;
+  /// Set by 'start' until the program first stops.
+  bool FAwaitingMain = false;
+  /// Whether the library has reported the program running since the last
+  /// resume, and a pause waits for that.
+  bool FResumeConfirmed = true;
+  bool FPauseWhenResumed = false;
   /// The end the session itself asked for, so that it is reported as such.
   TEnding FEnding = TEnding::None;
   /// The last signal reported, for the stop it brings.
