@@ -625,6 +625,18 @@ bool TGDBOutputParser::ProcessLogStream() {
   // that way wait under the echoed text.
   TGDBResult* WaitObject = FProcess.RemoveWaitObject(Text);
   if (!WaitObject) {
+    // GDB accepts more watchpoints than the hardware holds and finds out at
+    // the next resume, which it then refuses: that one is not placed.
+    constexpr std::string_view NoWatchSlot = "Could not insert hardware watchpoint ";
+    if (!FIsLLDB && Text.starts_with(NoWatchSlot)) {
+      const std::string_view Rest = std::string_view(Text).substr(NoWatchSlot.size());
+      const size_t End = Rest.find('.');
+      const Integer Watchpoint = MIStrToIntDef(Rest.substr(0, End), -1);
+      if (Watchpoint != -1) {
+        Log(etError, std::string(NoWatchSlot) + std::string(Rest.substr(0, End)) + ".");
+        FProcess.NotifyBreakpointLocations(Watchpoint, {});
+      }
+    }
     if (FProcess.IsWindows() && FProcess.IsAttachMode() && Text.find(AttachFailed) != std::string::npos)
       FProcess.NotifyProcessExited(-1, "");
     return false;
