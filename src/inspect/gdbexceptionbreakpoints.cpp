@@ -20,8 +20,9 @@ constexpr UInt64 PageSize = 4096;
 /// A name or message longer than this is not one.
 constexpr size_t MaxStringLength = 4096;
 
-/// "GNUCC++\0", the class of an exception the C++ runtime threw itself.
-constexpr UInt64 GNUCPPExceptionClass = 0x002B2B43434E5547;
+/// "GNUCC++\0" read as a number (its first letter highest), the class of an
+/// exception the C++ runtime threw itself.
+constexpr UInt64 GNUCPPExceptionClass = 0x474E5543432B2B00;
 /// libstdc++ on AMD64 keeps the thrown type 80 bytes before the unwind
 /// header that __cxa_begin_catch receives.
 constexpr UInt64 CXAExceptionTypeOffset = 80;
@@ -147,13 +148,21 @@ std::string TExceptionBreakpoint::ReadPChar(UInt64 Address) {
 }
 
 std::string TExceptionBreakpoint::ReadString(UInt64 Address) {
-  // The length byte and up to 255 characters after it, in one read.
-  const TDataByteArray Bytes = ReadBytes(FProcess, Address, 256);
+  // The length byte and what follows it in its page; the rest, if the
+  // string goes on into the next page, in a second read.
+  const UInt64 InPage = std::min<UInt64>(256, PageSize - Address % PageSize);
+  TDataByteArray Bytes = ReadBytes(FProcess, Address, static_cast<Integer>(InPage));
   if (Bytes.empty())
     return {};
-  const size_t Length = std::min<size_t>(Bytes[0], Bytes.size() - 1);
+  const size_t Length = Bytes[0];
+  if (Bytes.size() <= Length) {
+    const TDataByteArray Rest =
+        ReadBytes(FProcess, Address + Bytes.size(), static_cast<Integer>(Length + 1 - Bytes.size()));
+    Bytes.insert(Bytes.end(), Rest.begin(), Rest.end());
+  }
   const auto Begin = Bytes.begin() + 1;
-  return std::string(Begin, std::find(Begin, Begin + static_cast<std::ptrdiff_t>(Length), Byte{0}));
+  const auto End = Begin + static_cast<std::ptrdiff_t>(std::min(Length, Bytes.size() - 1));
+  return std::string(Begin, std::find(Begin, End, Byte{0}));
 }
 
 bool TExceptionBreakpoint::CallerLocation(TGDBLocation& Location) {
