@@ -75,6 +75,28 @@ bool TRawGdbPipes::Write(const std::string& Line) {
 
 Int64 TRawGdbPipes::Read(char* Buffer, size_t Count) { return ReadHandle(FStdOut.ReadHandle(), Buffer, Count); }
 
+bool TRawGdbSession::Start() { return TRawGdbPipes::Start() && Await("(gdb) \n"); }
+
+bool TRawGdbSession::Request(const std::string& Command, const std::string& Also) {
+  const std::string Token = std::to_string(++FToken);
+  return Write(Token + Command + "\n") && Await("\n" + Token + "^") && (Also.empty() || Await(Also));
+}
+
+bool TRawGdbSession::Await(const std::string& Text) {
+  char Buffer[4096];
+  for (;;) {
+    const size_t Found = FPending.find(Text);
+    if (Found != std::string::npos) {
+      FPending = "\n" + FPending.substr(Found + Text.size());
+      return true;
+    }
+    const Int64 BytesRead = Read(Buffer, sizeof Buffer);
+    if (BytesRead <= 0)
+      return false;
+    FPending.append(Buffer, static_cast<size_t>(BytesRead));
+  }
+}
+
 bool AwaitStops(const TQuietListener& Listener, int Count) {
   const auto Deadline = std::chrono::steady_clock::now() + std::chrono::seconds(30);
   while (Listener.Stops < Count) {

@@ -54,6 +54,23 @@ private:
   Integer FPid = -1;
 };
 
+/// The raw GDB answered line by line with blocking reads, as a front end
+/// that does nothing but wait for each reply would.
+class TRawGdbSession : public TRawGdbPipes {
+public:
+  /// Starts GDB and waits for its first prompt.
+  bool Start();
+  /// Sends Command under a fresh token and reads until its result record
+  /// and, when given, the text Also after it.
+  bool Request(const std::string& Command, const std::string& Also = {});
+  /// Reads until Text; what follows starts a line for later searches.
+  bool Await(const std::string& Text);
+
+private:
+  Cardinal FToken = 0;
+  std::string FPending = "\n";
+};
+
 /// Runs every registered benchmark (honouring the command-line options), then
 /// prints, for each pair, the first's mean real time per iteration divided by
 /// the second's. Returns the process exit code.

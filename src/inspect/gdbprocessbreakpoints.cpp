@@ -3,6 +3,7 @@
 
 #include "inspect/gdbbreakpointtable.h"
 #include "inspect/gdbexceptionbreakpoints.h"
+#include "inspect/gdbthreadtable.h"
 #include "process/gdbprocess.h"
 
 #include <array>
@@ -224,7 +225,10 @@ bool TGDBProcess::NotifyBreakpointOccurred(Integer Breakpoint, const TGDBLocatio
   FTerminal.Drain(false);
   DeferIfLive([this, Hits = std::move(Hits), Location, ThreadId] {
     EnsureThreadCreated(ThreadId);
-    SetCurrentSuspendedThread(ThreadId, Location);
+    // The language is asked when the stop is reported: a hit the listeners
+    // decline (an ignore count, an exception nobody stops at) costs no
+    // question.
+    FThreads->SetStopped(ThreadId, Location);
     bool Stop = false;
     TGDBLocation Reported = Location;
     TThreadStopReason Reason = tsrAtBreakpoint;
