@@ -155,6 +155,8 @@ void TCliSession::DescribeHit(nlohmann::json& Event, std::string& Text) {
     return;
   Event["breakpoint"] = Id;
   Text = (Found->second->Kind == "watchpoint" ? "Watchpoint " : "Breakpoint ") + std::to_string(Id) + ", " + Text;
+  if (Found->second->Temporary)
+    FBreakpoints.erase(Found);
 }
 
 bool TCliSession::OnException(Integer ThreadId, const TGDBException& Exception) {
