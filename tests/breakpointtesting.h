@@ -18,41 +18,38 @@
 
 namespace midebug::test {
 
-/// The IDE's side of one breakpoint.
+/// The IDE's side of one breakpoint: what it heard, and Stop as its answer.
 class TBreakpointRecorder : public TInterfaced<IGDBBreakpointListener> {
 public:
   struct TVerdict {
-    bool Verified;
-    Integer Breakpoint;
+    bool Verified = false;
+    Integer Breakpoint = -1;
     TGDBLocation Location;
   };
-  /// The answer to BreakpointHits.
   std::atomic<bool> Stop{true};
+  std::atomic<Integer> Hits{0}, LastThread{-1};
 
   void BreakpointHits(bool& ShouldStop, Integer ThreadId, TGDBLocation& /*Location*/) override {
     ShouldStop = Stop;
-    FLastThread = ThreadId;
-    ++FHits;
+    LastThread = ThreadId;
+    ++Hits;
   }
   void BreakpointVerified(bool Verified, Integer Breakpoint, const TGDBLocation& Location) override {
     std::lock_guard Guard(FLock);
     FVerdicts.push_back({Verified, Breakpoint, Location});
   }
-  Integer Hits() const { return FHits; }
-  Integer LastThread() const { return FLastThread; }
   std::vector<TVerdict> Verdicts() const {
     std::lock_guard Guard(FLock);
     return FVerdicts;
   }
   TVerdict Last() const {
     std::lock_guard Guard(FLock);
-    return FVerdicts.empty() ? TVerdict{false, -1, {}} : FVerdicts.back();
+    return FVerdicts.empty() ? TVerdict{} : FVerdicts.back();
   }
 
 private:
   mutable std::mutex FLock;
   std::vector<TVerdict> FVerdicts;
-  std::atomic<Integer> FHits{0}, FLastThread{-1};
 };
 
 /// The line of a debuggee's source marked "// line:Marker"; 0 without one.
@@ -78,9 +75,8 @@ protected:
                                                 Language, gcAMD64, "gdb");
     ASSERT_TRUE(Process);
   }
-  /// Launches and runs to the main function.
-  void LaunchToMain(const std::string& Program, TGDBLanguage Language = glC, const std::string& Arguments = "") {
-    Launch(Program, Language, Arguments);
+  void LaunchToMain(const std::string& Program, const std::string& Arguments = "") {
+    Launch(Program, glC, Arguments);
     ASSERT_TRUE(Process->SetRunToMainBreakpoint());
     Process->Run();
     ASSERT_TRUE(NextStop());
@@ -92,12 +88,10 @@ protected:
     StopsSeen = Listener->CountOf("Suspended(");
     return Stopped;
   }
-  bool ResumeToStop() {
-    Process->Resume();
-    return NextStop();
-  }
-  TGDBLocation StopLocation() { return Process->GetThread(Process->GetSuspendedThreadId())->GetCurrentLocation(); }
-  TThreadStopReason StopReason() { return Process->GetThread(Process->GetSuspendedThreadId())->GetStopReason(); }
+  bool ResumeToStop() { return Process->Resume(), NextStop(); }
+  TIntfPtr<IGDBThread> Stopped() { return Process->GetThread(Process->GetSuspendedThreadId()); }
+  TGDBLocation StopLocation() { return Stopped()->GetCurrentLocation(); }
+  TThreadStopReason StopReason() { return Stopped()->GetStopReason(); }
   /// The value of a C expression in the stopped program, as a number.
   UInt64 AddressOf(const std::string& Expression) {
     TDataEvaluateExpressionResult Value;

@@ -10,7 +10,7 @@ namespace {
 using test::Debuggee;
 using test::MarkedLine;
 
-/// Keeps every exception the IDE heard of and answers as told.
+/// Keeps the last exception the IDE heard of and answers as told.
 class TExceptionListener : public test::TTestListener {
 public:
   std::atomic<bool> StopOnException{true};
@@ -18,20 +18,16 @@ public:
     TTestListener::ExceptionRaised(ShouldStop, ThreadId, Exception);
     ShouldStop = StopOnException;
     std::lock_guard Guard(FLock);
-    FExceptions.push_back(Exception);
-  }
-  std::vector<TGDBException> Exceptions() const {
-    std::lock_guard Guard(FLock);
-    return FExceptions;
+    FLast = Exception;
   }
   TGDBException Last() const {
     std::lock_guard Guard(FLock);
-    return FExceptions.empty() ? DummyException : FExceptions.back();
+    return FLast;
   }
 
 private:
   mutable std::mutex FLock;
-  std::vector<TGDBException> FExceptions;
+  TGDBException FLast;
 };
 
 class Exceptions : public test::TDebugFixture {
@@ -47,85 +43,75 @@ protected:
     Process->SetOsException("SIGUSR1", true, true);
     Process->Run();
   }
-  /// The next exception stop: its exception and the stop reason.
-  bool NextException(TGDBException& Exception) {
-    if (!NextStop())
-      return false;
-    Exception = Heard->Last();
-    return StopReason() == tsrExceptRaised;
-  }
-
   TIntfPtr<TExceptionListener> Heard{new TExceptionListener};
 };
-
-TEST_F(Exceptions, ACppThrowNamesItsTypeAndPlaceAndTheCatchWhereItIsCaught) {
-  const auto Line = [](const char* Marker) { return MarkedLine("throws.cpp", Marker); };
-  LaunchAndRun("throws", glCPP, "1");
-  TGDBException Thrown, Caught, Own;
-  ASSERT_TRUE(NextException(Thrown));
-  EXPECT_EQ(Thrown.Kind, 16);
-  EXPECT_EQ(Thrown.Name, "St13runtime_error");
-  EXPECT_NE(Thrown.EObject, 0u);
-  EXPECT_EQ(Thrown.Location.Line, Line("throw"));
-  // The stop is told at the throw, in the program.
-  EXPECT_EQ(Process->GetThread(Process->GetSuspendedThreadId())->GetCurrentLocation().Line, Line("throw"));
-  ASSERT_TRUE(ResumeToStop());
-  Caught = Heard->Last();
-  EXPECT_EQ(Caught.Kind, 1);
-  EXPECT_EQ(Caught.Name, "St13runtime_error");
-  EXPECT_EQ(Caught.Location.Line, Line("catch"));
-  ASSERT_TRUE(ResumeToStop());
-  Own = Heard->Last();
-  EXPECT_EQ(Own.Name, "N6shapes8BadShapeE");
-  EXPECT_EQ(Own.Location.Line, Line("own-throw"));
-  Heard->StopOnException = false;
-  Process->Resume();
-  ASSERT_TRUE(Listener->PumpUntilCall("Exited("));
-  EXPECT_TRUE(Listener->HasCall("Exited(0,"));
-  EXPECT_EQ(Heard->Exceptions().size(), 4u);
-}
 
 TEST_F(Exceptions, AThousandThrowsAllDeclinedRunToTheEnd) {
   Heard->StopOnException = false;
   LaunchAndRun("throws", glCPP, "1000");
   ASSERT_TRUE(Listener->PumpUntilCall("Exited(", std::chrono::seconds(100)));
   EXPECT_TRUE(Listener->HasCall("Exited(0,"));
-  EXPECT_EQ(Heard->Exceptions().size(), 2002u);
+  EXPECT_EQ(Listener->CountOf("Exception("), 2002u);
   EXPECT_FALSE(Listener->HasCall("Suspended("));
 }
 
-TEST_F(Exceptions, TheNotifierFunctionsReportKindObjectNameAndAddress) {
-  LaunchAndRun("notifier", glC);
-  TGDBException FromCpp, FromPascal;
-  ASSERT_TRUE(NextException(FromCpp));
-  EXPECT_EQ(FromCpp.Kind, 3);
-  EXPECT_EQ(FromCpp.Name, "ETooBig");
-  EXPECT_EQ(FromCpp.Location.Address, 0x1234u);
-  EXPECT_NE(FromCpp.EObject, 0u);
-  ASSERT_TRUE(ResumeToStop());
-  FromPascal = Heard->Last();
-  EXPECT_EQ(FromPascal.Kind, 5);
-  EXPECT_EQ(FromPascal.Name, "EPasky");
-  EXPECT_EQ(FromPascal.Location.Address, 0x5678u);
-  EXPECT_EQ(FromPascal.EObject, FromCpp.EObject);
-  Process->Resume();
-  ASSERT_TRUE(Listener->PumpUntilCall("Exited(0,"));
+/// One exception stop: what the IDE hears of it, and where the stop is
+/// told (a line of Source when Line is not 0, else the address).
+struct TExpected {
+  Integer Kind;
+  const char* Name;
+  const char* Desc;
+  const char* Source;
+  const char* Marker;
+  UInt64 Address;
+};
+
+struct TProgramCase {
+  const char* Program;
+  TGDBLanguage Language;
+  const char* Arguments;
+  std::vector<TExpected> Stops;
+};
+
+class ExceptionStops : public Exceptions, public ::testing::WithParamInterface<TProgramCase> {};
+
+// C++ throws are named by the mangled type and told where the program threw
+// or caught; Free Pascal's raise by class and message; the notifiers pass
+// kind, name and address through (a zero address falls back to the fifth
+// argument).
+TEST_P(ExceptionStops, EachIsToldWithWhatItNamesAndTheProgramRunsOn) {
+  const TProgramCase& Case = GetParam();
+  LaunchAndRun(Case.Program, Case.Language, Case.Arguments);
+  for (const TExpected& Expected : Case.Stops) {
+    SCOPED_TRACE(Expected.Name);
+    ASSERT_TRUE(NextStop());
+    const TGDBException Told = Heard->Last();
+    EXPECT_EQ(StopReason(), tsrExceptRaised);
+    EXPECT_TRUE(Told.Kind == Expected.Kind && Told.Name == Expected.Name && Told.Desc == Expected.Desc);
+    EXPECT_NE(Told.EObject, 0u);
+    if (Expected.Marker)
+      EXPECT_TRUE(Told.Location.Line == MarkedLine(Expected.Source, Expected.Marker) &&
+                  StopLocation().Line == Told.Location.Line);
+    else
+      EXPECT_EQ(Told.Location.Address, Expected.Address);
+    // What follows the last one expected runs on.
+    Heard->StopOnException = &Expected != &Case.Stops.back();
+    Process->Resume();
+  }
+  EXPECT_TRUE(Listener->PumpUntilCall("Exited(0,"));
 }
 
-TEST_F(Exceptions, APascalRaiseNamesTheClassAndTheMessageOfAnException) {
-  LaunchAndRun("raises", glPascal);
-  TGDBException Raised, Plain;
-  ASSERT_TRUE(NextException(Raised));
-  EXPECT_EQ(Raised.Name, "ETooDeep");
-  EXPECT_EQ(Raised.Desc, "depth 12 is too deep");
-  EXPECT_EQ(Raised.Location.Line, MarkedLine("raises.pas", "raise"));
-  ASSERT_TRUE(ResumeToStop());
-  Plain = Heard->Last();
-  EXPECT_EQ(Plain.Name, "TPlain");
-  EXPECT_EQ(Plain.Desc, "");
-  Process->Resume();
-  ASSERT_TRUE(Listener->PumpUntilCall("Exited(0,"));
-}
+INSTANTIATE_TEST_SUITE_P(
+    Languages, ExceptionStops,
+    ::testing::Values(
+        TProgramCase{"throws", glCPP, "1",
+                     {{16, "St13runtime_error", "", "throws.cpp", "throw", 0},
+                      {1, "St13runtime_error", "", "throws.cpp", "catch", 0},
+                      {16, "N6shapes8BadShapeE", "", "throws.cpp", "own-throw", 0}}},
+        TProgramCase{"raises", glPascal, "",
+                     {{8, "ETooDeep", "depth 12 is too deep", "raises.pas", "raise", 0}}},
+        TProgramCase{"notifier", glC, "", {{3, "ETooBig", "", "", nullptr, 0x1234}, {5, "EPasky", "", "", nullptr, 0x5678}}}),
+    [](const ::testing::TestParamInfo<TProgramCase>& Info) { return std::string(Info.param.Program); });
 
 } // namespace
 } // namespace midebug

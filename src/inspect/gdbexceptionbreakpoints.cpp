@@ -26,6 +26,8 @@ constexpr UInt64 GNUCPPExceptionClass = 0x474E5543432B2B00;
 /// libstdc++ on AMD64 keeps the thrown type 80 bytes before the unwind
 /// header that __cxa_begin_catch receives.
 constexpr UInt64 CXAExceptionTypeOffset = 80;
+/// The thrown object follows that header.
+constexpr UInt64 CXAUnwindHeaderSize = 32;
 
 /// Free Pascal 3.2.2's class layout on 64-bit targets: the object starts
 /// with its class's method table, which holds the parent's table by
@@ -219,9 +221,11 @@ bool TCXACatchBreakpoint::GetExceptionInfo(TGDBException& E) {
   // The type caught, when the runtime threw the exception itself.
   TUInt64Array Arguments;
   UInt64 ExceptionClass = 0, TypeInfo = 0, MangledName = 0;
-  if (ReadArguments(Arguments, 1) && Arguments[0] > CXAExceptionTypeOffset &&
-      ReadWord(Arguments[0], ExceptionClass) && ExceptionClass == GNUCPPExceptionClass &&
-      ReadWord(Arguments[0] - CXAExceptionTypeOffset, TypeInfo) && ReadWord(TypeInfo + 8, MangledName))
+  if (!ReadArguments(Arguments, 1) || Arguments[0] <= CXAExceptionTypeOffset ||
+      !ReadWord(Arguments[0], ExceptionClass) || ExceptionClass != GNUCPPExceptionClass)
+    return true;
+  E.EObject = Arguments[0] + CXAUnwindHeaderSize;
+  if (ReadWord(Arguments[0] - CXAExceptionTypeOffset, TypeInfo) && ReadWord(TypeInfo + 8, MangledName))
     E.Name = ReadPChar(MangledName);
   return true;
 }
