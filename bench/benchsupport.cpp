@@ -75,18 +75,27 @@ bool TRawGdbPipes::Write(const std::string& Line) {
 
 Int64 TRawGdbPipes::Read(char* Buffer, size_t Count) { return ReadHandle(FStdOut.ReadHandle(), Buffer, Count); }
 
-bool TRawGdbSession::Start() { return TRawGdbPipes::Start() && Await("(gdb) \n"); }
-
-bool TRawGdbSession::Request(const std::string& Command, const std::string& Also) {
+bool TRawGdbPipes::Request(const std::string& Command, const std::string& Also, std::string* Reply) {
   const std::string Token = std::to_string(++FToken);
-  return Write(Token + Command + "\n") && Await("\n" + Token + "^") && (Also.empty() || Await(Also));
+  return Write(Token + Command + "\n") && Await("\n" + Token + "^") && (!Reply || Await("\n", Reply)) &&
+         (Also.empty() || Await(Also));
 }
 
-bool TRawGdbSession::Await(const std::string& Text) {
+bool TRawGdbPipes::StartProgram(const std::string& Program, const std::string& Location) {
+  return Await("(gdb) \n") && Request("-file-exec-and-symbols \"" + Program + "\"") &&
+         Request("-break-insert -f " + Location) && Request("-exec-run", "*stopped");
+}
+
+bool TRawGdbPipes::Await(const std::string& Text, std::string* Before) {
   char Buffer[4096];
+  // The line start a search leaves in front is not part of what follows.
+  const size_t From = Before ? 1 : 0;
   for (;;) {
-    const size_t Found = FPending.find(Text);
+    const size_t Found = FPending.find(Text, From);
     if (Found != std::string::npos) {
+      if (Before)
+        *Before = FPending.substr(From, Found - From);
+      // What follows starts a line as far as later searches go.
       FPending = "\n" + FPending.substr(Found + Text.size());
       return true;
     }

@@ -105,15 +105,13 @@ void BM_BreakpointHitVsRawMI(benchmark::State& State) {
   const std::string Program = Build("loop", LoopSource, false);
   TIntfPtr<bench::TQuietListener> Listener(new bench::TQuietListener);
   TIntfPtr<IGDBProcess> Process = Program.empty() ? nullptr : Launch(Listener, Program, glC, State);
-  bench::TRawGdbSession Raw;
+  bench::TRawGdbPipes Raw;
   if (!Process)
     return;
   const std::string TickLocation = "loop.c:" + std::to_string(TickLine);
   Process->CreateSourceBreakpoint("loop.c", TickLine, TIntfPtr<IGDBBreakpointListener>(new TStoppingBreakpoint));
   Process->Run();
-  if (!bench::AwaitStops(*Listener, 1) || !Raw.Start() ||
-      !Raw.Request("-file-exec-and-symbols \"" + Program + "\"") || !Raw.Request("-break-insert -f " + TickLocation) ||
-      !Raw.Request("-exec-run", "*stopped")) {
+  if (!bench::AwaitStops(*Listener, 1) || !Raw.Start() || !Raw.StartProgram(Program, TickLocation)) {
     State.SkipWithError("cannot reach the breakpoint");
     return;
   }
@@ -149,14 +147,12 @@ void BM_SetHundredBreakpointsVsRawMI(benchmark::State& State) {
   const std::string Program = Build("loop", LoopSource, false);
   TIntfPtr<bench::TQuietListener> Listener(new bench::TQuietListener);
   TIntfPtr<IGDBProcess> Process = Program.empty() ? nullptr : Launch(Listener, Program, glC, State);
-  bench::TRawGdbSession Raw;
+  bench::TRawGdbPipes Raw;
   if (!Process)
     return;
   Process->SetRunToMainBreakpoint();
   Process->Run();
-  if (!bench::AwaitStops(*Listener, 1) || !Raw.Start() ||
-      !Raw.Request("-file-exec-and-symbols \"" + Program + "\"") || !Raw.Request("-break-insert -f main") ||
-      !Raw.Request("-exec-run", "*stopped")) {
+  if (!bench::AwaitStops(*Listener, 1) || !Raw.Start() || !Raw.StartProgram(Program, "main")) {
     State.SkipWithError("cannot reach main");
     return;
   }
@@ -187,7 +183,7 @@ BENCHMARK(BM_SetHundredBreakpointsVsRawMI)->UseRealTime()->Iterations(5)->Repeti
 
 /// The raw side of a declined throw and catch: the requests the library
 /// makes to read each, then the resume.
-bool RawThrowAndCatch(bench::TRawGdbSession& Raw) {
+bool RawThrowAndCatch(bench::TRawGdbPipes& Raw) {
   return Raw.Await("*stopped") && Raw.Request("-data-list-register-values x 5 4") &&
          Raw.Request("-stack-list-frames 1 1") && Raw.Request("-data-read-memory-bytes $rsi 8") &&
          Raw.Request("-data-read-memory-bytes $sp 64") && Raw.Request("-exec-continue") && Raw.Await("*stopped") &&
@@ -218,8 +214,8 @@ void BM_ThousandDeclinedThrowsVsRawMI(benchmark::State& State) {
     Process = nullptr;
     ProcessPending();
 
-    bench::TRawGdbSession Raw;
-    bool RawDone = Raw.Start() && Raw.Request("-file-exec-and-symbols \"" + Program + "\"") &&
+    bench::TRawGdbPipes Raw;
+    bool RawDone = Raw.Start() && Raw.Await("(gdb) \n") && Raw.Request("-file-exec-and-symbols \"" + Program + "\"") &&
                    Raw.Request("-interpreter-exec console \"handle SIGUSR1 stop print pass\"");
     for (const char* Function :
          {"_DbgExcNotify", "_CPPDbgExcNotify", "__cxa_throw", "__cxa_begin_catch", "fpc_raiseexception"})

@@ -36,21 +36,12 @@ std::string BuildLoopProgram() {
   return std::system(Command.c_str()) == 0 ? Program : std::string();
 }
 
-/// The raw GDB stopped at main of Program.
-class TRawGdb : public bench::TRawGdbSession {
-public:
-  bool Start(const std::string& Program) {
-    return TRawGdbSession::Start() && Request("-file-exec-and-symbols \"" + Program + "\"") &&
-           Request("-break-insert -f main") && Request("-exec-run", "*stopped");
-  }
-};
-
 void BM_StepOverVsRawMI(benchmark::State& State) {
   SetMainThread();
   const std::string Program = BuildLoopProgram();
   TIntfPtr<bench::TQuietListener> Listener(new bench::TQuietListener);
   TIntfPtr<IGDBProcess> Process;
-  TRawGdb Raw;
+  bench::TRawGdbPipes Raw;
   try {
     Process = TGDBProcessManager::CreateProcess(Listener, Program, "", "", "local", "Linux64", glC, gcAMD64, "gdb");
   } catch (const ENonAIRException& Error) {
@@ -59,7 +50,7 @@ void BM_StepOverVsRawMI(benchmark::State& State) {
   }
   Process->SetRunToMainBreakpoint();
   Process->Run();
-  if (Program.empty() || !bench::AwaitStops(*Listener, 1) || !Raw.Start(Program)) {
+  if (Program.empty() || !bench::AwaitStops(*Listener, 1) || !Raw.Start() || !Raw.StartProgram(Program, "main")) {
     State.SkipWithError("cannot reach main");
     return;
   }

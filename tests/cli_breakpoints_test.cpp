@@ -25,7 +25,7 @@ public:
     const std::string Command = "cd " + Quote(Scratch.Path()) + " && " + Quote(MIDEBUG_CLI) +
                                 " --batch --json --wait 20 " + Arguments + " < " + Quote(Input) + " > " +
                                 Quote(Output) + " 2>/dev/null";
-    EXPECT_EQ(std::system(Command.c_str()), 0);
+    Status = std::system(Command.c_str());
     std::ifstream Lines(Output);
     for (std::string Line; std::getline(Lines, Line);) {
       Text += Line + "\n";
@@ -44,6 +44,8 @@ public:
   }
   std::vector<json> Objects;
   std::string Text;
+  /// A batch with a failed command ends with a failure.
+  int Status = -1;
 };
 
 Integer Line(const std::string& File, const std::string& Marker) { return test::MarkedLine(File, Marker); }
@@ -135,6 +137,7 @@ TEST_F(CliBreakpoints, WrongArgumentsGetAClearErrorAndTheSessionGoesOn) {
     EXPECT_EQ(Errors[Index]["error"], Expected[Index].second);
   }
   EXPECT_EQ(Run.All("answer", "info").back()["breakpoints"][0]["verified"], true);
+  EXPECT_NE(Run.Status, 0);
 }
 
 } // namespace

@@ -26,6 +26,7 @@ struct TCliSession::TCliBreakpoint {
   std::vector<TGDBLocation> Locations;
   Integer Hits = 0;
   Integer IgnoreCount = 0;
+  TPlace Place;
 };
 
 namespace {
@@ -87,15 +88,32 @@ const std::set<std::string> CatchKinds = {"throw", "catch", "raise"};
 
 } // namespace
 
-TIntfPtr<IGDBBreakpointListener> TCliSession::NewBreakpoint(const std::string& Kind, const std::string& Where,
-                                                             bool Temporary) {
+void TCliSession::NewBreakpoint(const std::string& Kind, const std::string& Where, bool Temporary, TPlace Place) {
   auto Breakpoint = std::make_shared<TCliBreakpoint>();
   Breakpoint->Id = FNextBreakpoint++;
   Breakpoint->Kind = Kind;
   Breakpoint->Where = Where;
   Breakpoint->Temporary = Temporary;
+  Breakpoint->Place = std::move(Place);
   FBreakpoints[Breakpoint->Id] = Breakpoint;
-  return TIntfPtr<IGDBBreakpointListener>(new TCliBreakpointListener(*this, Breakpoint->Id));
+  Breakpoint->Place(*FProcess, TIntfPtr<IGDBBreakpointListener>(new TCliBreakpointListener(*this, Breakpoint->Id)));
+  FOutput.Emit({{"answer", Kind == "watchpoint" ? "watch" : Temporary ? "tbreak" : "break"}, {"id", Breakpoint->Id},
+                {"verified", Breakpoint->Verified}},
+               "");
+}
+
+void TCliSession::RestoreBreakpoints() {
+  for (auto& [Id, Breakpoint] : FBreakpoints) {
+    Breakpoint->Number = -1;
+    Breakpoint->Verified = false;
+    Breakpoint->Locations.clear();
+    Breakpoint->Place(*FProcess, TIntfPtr<IGDBBreakpointListener>(new TCliBreakpointListener(*this, Id)));
+    if (Breakpoint->Enabled)
+      continue;
+    FProcess->DisableBreakpoint(Breakpoint->Number);
+  }
+  if (!FCatches.empty())
+    FProcess->SetOsException("SIGTRAP", true, false);
 }
 
 bool TCliSession::OnBreakpointHit(Integer Id) {
@@ -193,17 +211,21 @@ void TCliSession::CmdBreak(const std::string& Name, const std::vector<std::strin
       FOutput.Error(Name, "not an address: " + Where.substr(1));
       return;
     }
-    FProcess->CreateAddressBreakpoint(Address, NewBreakpoint("breakpoint", Where, Name == "tbreak"));
+    NewBreakpoint("breakpoint", Where, Name == "tbreak", [Address](IGDBProcess& Process, const auto& Listener) {
+      Process.CreateAddressBreakpoint(Address, Listener);
+    });
   } else if (Colon != std::string::npos && Colon > 0 && ParseCount(Where.substr(Colon + 1), Line) && Line > 0) {
-    FProcess->CreateSourceBreakpoint(Where.substr(0, Colon), Line, NewBreakpoint("breakpoint", Where, Name == "tbreak"));
+    NewBreakpoint("breakpoint", Where, Name == "tbreak",
+                  [File = Where.substr(0, Colon), Line](IGDBProcess& Process, const auto& Listener) {
+                    Process.CreateSourceBreakpoint(File, Line, Listener);
+                  });
   } else if (Colon != std::string::npos && Where.find("::") == std::string::npos) {
     FOutput.Error(Name, "not a line: " + Where.substr(Colon + 1));
-    return;
   } else {
-    FProcess->CreateFunctionBreakpoint(Where, NewBreakpoint("breakpoint", Where, Name == "tbreak"));
+    NewBreakpoint("breakpoint", Where, Name == "tbreak", [Where](IGDBProcess& Process, const auto& Listener) {
+      Process.CreateFunctionBreakpoint(Where, Listener);
+    });
   }
-  const TCliBreakpoint& Made = *FBreakpoints.rbegin()->second;
-  FOutput.Emit({{"answer", Name}, {"id", Made.Id}, {"verified", Made.Verified}}, "");
 }
 
 void TCliSession::CmdWatch(const std::string& Name, const std::vector<std::string>& Arguments) {
@@ -222,13 +244,12 @@ void TCliSession::CmdWatch(const std::string& Name, const std::vector<std::strin
   if (!RequireStopped(Name))
     return;
   const std::string Where = Words[0] + (Size > 0 ? " (" + std::to_string(Size) + " bytes)" : "");
-  TIntfPtr<IGDBBreakpointListener> Listener = NewBreakpoint("watchpoint", Where, false);
-  if (Size > 0)
-    FProcess->CreateSizedWatchBreakpoint(Address, Size, Read, Access, Listener);
-  else
-    FProcess->CreateWatchBreakpoint(Address, Read, Access, Listener);
-  const TCliBreakpoint& Made = *FBreakpoints.rbegin()->second;
-  FOutput.Emit({{"answer", Name}, {"id", Made.Id}, {"verified", Made.Verified}}, "");
+  NewBreakpoint("watchpoint", Where, false, [=](IGDBProcess& Process, const auto& Listener) {
+    if (Size > 0)
+      Process.CreateSizedWatchBreakpoint(Address, Size, Read, Access, Listener);
+    else
+      Process.CreateWatchBreakpoint(Address, Read, Access, Listener);
+  });
 }
 
 TCliSession::TCliBreakpoint* TCliSession::FindBreakpoint(const std::string& Name, const std::string& Text) {
