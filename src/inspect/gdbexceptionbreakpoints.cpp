@@ -111,14 +111,17 @@ bool TExceptionBreakpoint::ReadArguments(TUInt64Array& Values, size_t Count) {
 
 namespace {
 
-/// Up to Count bytes at Address; empty when unreadable.
+/// Count bytes at Address, through the process's memory cache; empty when
+/// unreadable.
 TDataByteArray ReadBytes(TGDBProcess& Process, UInt64 Address, Integer Count) {
-  TDataReadMemoryResult Memory(true);
-  if (Address == 0 || !Process.Requests().Ask(Memory, [&](TGDBCommand& Builder, std::string& Token) {
-        return Builder.CreateDataReadMemoryBytesCommand(Token, Address, Count, 0);
-      }))
+  if (Address == 0 || Count <= 0)
     return {};
-  return std::move(Memory.FData);
+  TDataByteArray Bytes(static_cast<size_t>(Count));
+  const Integer Read = Process.GetMemory(Address, Bytes.data(), Count);
+  if (Read <= 0)
+    return {};
+  Bytes.resize(static_cast<size_t>(Read));
+  return Bytes;
 }
 
 } // namespace
