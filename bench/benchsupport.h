@@ -53,12 +53,11 @@ public:
   bool Request(const std::string& Command, const std::string& Also = {}, std::string* Reply = nullptr);
   /// Loads Program, breaks at Location and runs to it.
   bool StartProgram(const std::string& Program, const std::string& Location);
-
-private:
   /// Reads until Text has arrived; what came before it (after the line
   /// start the last search left) goes to Before when given.
   bool Await(const std::string& Text, std::string* Before = nullptr);
 
+private:
   Cardinal FToken = 0;
   std::string FPending = "\n";
   TPipe FStdIn;

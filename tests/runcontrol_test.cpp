@@ -6,8 +6,7 @@
 #include "midebug.h"
 #include "platform/hostfiles.h"
 #include "process/gdbprocess.h"
-#include "testlistener.h"
-#include "testsupport.h"
+#include "breakpointtesting.h"
 
 #include <gtest/gtest.h>
 
@@ -21,7 +20,6 @@ namespace {
 using test::Debuggee;
 using test::ProcessRuns;
 using test::TFakeOnPath;
-using test::TScratchDir;
 using test::TTestListener;
 
 TGDBProcess& ProcessOf(const TIntfPtr<IGDBProcess>& Process) { return *static_cast<TGDBProcess*>(Process.get()); }
@@ -47,41 +45,14 @@ constexpr Integer MainFirstLine = 6;
 constexpr Integer MainCallLine = 7;
 constexpr Integer MainReturnLine = 8;
 
-class RunControl : public ::testing::Test {
+class RunControl : public test::TDebugFixture {
 protected:
-  void SetUp() override { SetMainThread(); }
-  void TearDown() override {
-    Process = nullptr;
-    ProcessPending();
-  }
-
-  /// Creates the process for Program through the "local" profile.
-  void Launch(const std::string& Program, TGDBLanguage Language = glC, const std::string& Arguments = "") {
-    ASSERT_FALSE(Program.empty());
-    Process = TGDBProcessManager::CreateProcess(Listener, Program, Arguments, Scratch.Path(), "local", "Linux64",
-                                                Language, gcAMD64, "gdb");
-    ASSERT_TRUE(Process);
-  }
-  /// Pumps until the IDE has heard one more stop than before.
-  bool NextStop() {
-    const size_t Before = StopsSeen;
-    const bool Stopped = Listener->PumpUntil([&] { return Listener->CountOf("Suspended(") > Before; });
-    StopsSeen = Listener->CountOf("Suspended(");
-    return Stopped;
-  }
-  TGDBLocation StopLocation() { return Process->GetThread(Process->GetSuspendedThreadId())->GetCurrentLocation(); }
-  TThreadStopReason StopReason() { return Process->GetThread(Process->GetSuspendedThreadId())->GetStopReason(); }
   /// Releases the process and tells whether its debugger has gone.
   bool ReleaseAndCheckDebuggerGone() {
     Process = nullptr;
     ProcessPending();
     return test::ChildrenNamed("gdb").empty();
   }
-
-  TScratchDir Scratch;
-  TIntfPtr<TTestListener> Listener{new TTestListener};
-  TIntfPtr<IGDBProcess> Process;
-  size_t StopsSeen = 0;
 };
 
 struct TMainCase {

@@ -109,10 +109,14 @@ TEST(TranscriptEvents, StopsOfBreakpointsStepsFinishAndWatchpointsInOrder) {
   for (const TStop& Stop : Stops)
     EXPECT_EQ(Stop.ThreadId, 1);
 
-  ASSERT_EQ(Replay.Process.BreakpointHits.size(), 2u);
+  // A watchpoint's hit is offered to its listener by the first number the
+  // stop names.
+  ASSERT_EQ(Replay.Process.BreakpointHits.size(), 4u);
   EXPECT_EQ(Replay.Process.BreakpointHits[0].first, 1);
   EXPECT_EQ(Replay.Process.BreakpointHits[1].first, 2);
   EXPECT_EQ(Replay.Process.BreakpointHits[1].second.Location.Address, 0x0000555555555163u);
+  EXPECT_EQ(Replay.Process.BreakpointHits[2].first, 3);
+  EXPECT_EQ(Replay.Process.BreakpointHits[3].first, 5);
 }
 
 TEST(TranscriptEvents, ExitCodesReadAsGdbMeansThem) {

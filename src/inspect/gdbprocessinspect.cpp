@@ -5,12 +5,6 @@
 
 namespace midebug {
 
-void TGDBProcess::CreateSourceBreakpoint(const std::string&, Integer, const TIntfPtr<IGDBBreakpointListener>&) {}
-void TGDBProcess::CreateAddressBreakpoint(UInt64, const TIntfPtr<IGDBBreakpointListener>&) {}
-void TGDBProcess::CreateWatchBreakpoint(UInt64, bool, bool, const TIntfPtr<IGDBBreakpointListener>&) {}
-void TGDBProcess::DeleteBreakpoint(Integer) {}
-void TGDBProcess::EnableBreakpoint(Integer) {}
-void TGDBProcess::DisableBreakpoint(Integer) {}
 void TGDBProcess::GetSourceLines(const std::string&, TIntegerArray& Lines) { Lines.clear(); }
 bool TGDBProcess::FindSourceLine(UInt64, UInt64&, Integer&, Integer&, Integer&) { return false; }
 TAddressArray TGDBProcess::FindSourceAddress(Integer, Integer) { return {}; }

@@ -268,16 +268,32 @@ std::string TGDBCommand::CreateBreakInsertCommand(std::string& Token, UInt64 Add
   return CreateBreakInsertCommand(Token, "*" + Hex(Address), Temporary, true);
 }
 
+namespace {
+
+/// GDB takes the options only before the expression; behind it they are
+/// "garbage following <expression>".
+std::string WatchOption(bool ReadFlag, bool AccessFlag) {
+  if (ReadFlag && !AccessFlag)
+    return " -r";
+  if (AccessFlag && !ReadFlag)
+    return " -a";
+  return {};
+}
+
+} // namespace
+
 std::string TGDBCommand::CreateBreakWatchCommand(std::string& Token, const std::string& Expr, bool ReadFlag,
                                                  bool AccessFlag) {
-  // GDB takes the options only before the expression; behind it they are
-  // "garbage following <expression>".
-  std::string Option;
-  if (ReadFlag && !AccessFlag)
-    Option = " -r";
-  else if (AccessFlag && !ReadFlag)
-    Option = " -a";
-  return MiLine(Token, ctBreakWatch, Option + " " + Expr);
+  return MiLine(Token, ctBreakWatch, WatchOption(ReadFlag, AccessFlag) + " " + Expr);
+}
+
+std::string TGDBCommand::CreateBreakWatchCommand(std::string& Token, UInt64 Address, Integer Size, bool ReadFlag,
+                                                 bool AccessFlag) {
+  // The byte array is C's syntax; "--language" (which GDB reads only first)
+  // makes it valid in a Pascal frame too.
+  return MiLine(Token, ctBreakWatch,
+                " --language c" + WatchOption(ReadFlag, AccessFlag) + " *(char(*)[" + std::to_string(Size) + "])" +
+                    Hex(Address));
 }
 
 std::string TGDBCommand::CreateBreakWatchCommand(std::string& Token, UInt64 Address, bool ReadFlag,

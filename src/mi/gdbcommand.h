@@ -144,6 +144,9 @@ public:
   /// Watches the memory at Address: "0xADDR^" in Pascal syntax, "*0xADDR" in C.
   std::string CreateBreakWatchCommand(std::string& Token, UInt64 Address, bool ReadFlag, bool AccessFlag,
                                       bool PascalSyntax);
+  /// Watches Size bytes at Address, whatever the language GDB is in.
+  std::string CreateBreakWatchCommand(std::string& Token, UInt64 Address, Integer Size, bool ReadFlag,
+                                      bool AccessFlag);
 
   // Program arguments, environment and threads
   /// Escape doubles every backslash, for debuggers that read the arguments as

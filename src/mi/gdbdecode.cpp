@@ -91,6 +91,9 @@ void PlaceByLevel(std::vector<TItem>& Array, Integer Level, TItem&& Item) {
   Array[Slot] = std::move(Item);
 }
 
+/// GDB's address of a breakpoint it has not placed yet.
+constexpr std::string_view PendingAddress = "<PENDING>";
+
 bool ValidLevel(Integer Level) { return Level >= 0 && Level <= MaxFrameLevel; }
 
 /// The address of every location tuple of a breakpoint that resolved to
@@ -99,10 +102,12 @@ bool ValidLevel(Integer Level) { return Level >= 0 && Level <= MaxFrameLevel; }
 /// they come as "locations" inside it. FLocation becomes the first's.
 void ReadBreakpointLocations(TMIScanner& Scanner, std::string_view Locations, TBreakInsertResult& Breakpoint) {
   TAddressArray Addresses;
+  TGDBLocationArray Located;
   auto ReadLocation = [&] {
-    if (Addresses.empty())
-      ParseLocation(Scanner, Breakpoint.FLocation);
-    Addresses.push_back(Scanner.FindUInt64("addr", 0));
+    TGDBLocation Location;
+    ParseLocation(Scanner, Location);
+    Addresses.push_back(Location.Address);
+    Located.push_back(std::move(Location));
   };
   if (!Locations.empty()) {
     ForEachElement(Scanner, Locations, [&](std::string_view Element) {
@@ -121,9 +126,35 @@ void ReadBreakpointLocations(TMIScanner& Scanner, std::string_view Locations, TB
       Scanner.NextChar();
     }
   }
-  if (!Addresses.empty())
-    Breakpoint.FAddresses = std::move(Addresses);
+  if (Addresses.empty())
+    return;
+  Breakpoint.FLocation = Located.front();
+  Breakpoint.FAddresses = std::move(Addresses);
+  Breakpoint.FLocations = std::move(Located);
 }
+
+} // namespace
+
+bool ReadGDBBreakpoint(TMIScanner& Scanner, std::string_view Bkpt, Integer& Number, TGDBLocationArray& Locations) {
+  TBreakInsertResult Breakpoint;
+  {
+    TMIScanner::TNestedScan InBkpt(Scanner, Bkpt);
+    Number = Scanner.FindInteger("number", -1);
+    if (Number == -1)
+      return false;
+    ParseLocation(Scanner, Breakpoint.FLocation);
+    Breakpoint.FPending = Scanner.FindValue("addr") == PendingAddress;
+  }
+  Locations.clear();
+  ReadBreakpointLocations(Scanner, {}, Breakpoint);
+  if (!Breakpoint.FLocations.empty())
+    Locations = std::move(Breakpoint.FLocations);
+  else if (!Breakpoint.FPending)
+    Locations.push_back(Breakpoint.FLocation);
+  return true;
+}
+
+namespace {
 
 bool DecodeBreakInsert(TBreakInsertResult& Breakpoint, TMIScanner& Scanner) {
   const std::string_view Bkpt = TakeNext(Scanner, "bkpt");
@@ -135,6 +166,7 @@ bool DecodeBreakInsert(TBreakInsertResult& Breakpoint, TMIScanner& Scanner) {
       if (Breakpoint.FBreakpoint == -1)
         return false;
       ParseLocation(Scanner, Breakpoint.FLocation);
+      Breakpoint.FPending = Scanner.FindValue("addr") == PendingAddress;
       FindResult(Scanner, "locations", Locations);
     }
     // The cursor is now after "bkpt", on the location tuples GDB 13 puts

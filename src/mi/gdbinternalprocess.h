@@ -66,6 +66,9 @@ public:
   /// The debugger refused a command that was to resume the stopped program
   /// ("finish" in the outermost frame): the program did not move.
   virtual void NotifyCommandRefused(const std::string& Message) = 0;
+  /// GDB changed a breakpoint: where it now stands, one location per place,
+  /// none while it is pending. GDB also says so at every hit.
+  virtual void NotifyBreakpointLocations(Integer /*Breakpoint*/, const TGDBLocationArray& /*Locations*/) {}
 };
 
 } // namespace midebug

@@ -325,8 +325,20 @@ void TGDBOutputParser::ProcessStopRecord() {
       FProcess.NotifyProcessSuspended(FLocation, ThreadId, tsrAtBreakpoint);
   } else if (Reason == "watchpoint-trigger" || Reason == "read-watchpoint-trigger" ||
              Reason == "access-watchpoint-trigger") {
+    // The watchpoint's number lets its listener hear the hit like any
+    // breakpoint's; one nobody registered is a plain stop.
+    Integer Watchpoint = -1;
+    for (const std::string_view Name : {"wpt", "hw-rwpt", "hw-awpt"}) {
+      const std::string_view Tuple = FScanner.FindValue(Name);
+      if (Tuple.empty())
+        continue;
+      TMIScanner::TNestedScan InTuple(FScanner, Tuple);
+      Watchpoint = FScanner.FindInteger("number", -1);
+      break;
+    }
     ParseStopFrame(FScanner, FLocation, ThreadId);
-    FProcess.NotifyProcessSuspended(FLocation, ThreadId, tsrAtBreakpoint);
+    if (!FProcess.NotifyBreakpointOccurred(Watchpoint, FLocation, ThreadId))
+      FProcess.NotifyProcessSuspended(FLocation, ThreadId, tsrAtBreakpoint);
   } else if (Reason == "function-finished" || Reason == "location-reached" || Reason == "end-stepping-range") {
     ParseStopFrame(FScanner, FLocation, ThreadId);
     FProcess.NotifyProcessSuspended(FLocation, ThreadId, tsrStepDone);
@@ -448,10 +460,17 @@ bool TGDBOutputParser::ProcessNotifyRecord() {
     if (Results() && ParseSharedLibraryInfo())
       FProcess.NotifyModuleLoaded(FModule);
   } else if (Class == "breakpoint-modified") {
-    // GDB reports every hit this way; only LLDB's moved breakpoints matter.
+    // GDB reports every hit this way too, and a pending breakpoint that
+    // resolved; the process sorts out what changed.
     Integer Breakpoint = -1;
     if (FIsLLDB && Results() && ParseBreakpointTuple(Breakpoint))
       FProcess.NotifyBreakpointModified(Breakpoint, FLocation);
+    else if (!FIsLLDB && Results()) {
+      TGDBLocationArray Locations;
+      const std::string_view Bkpt = FScanner.FindValue("bkpt");
+      if (ReadGDBBreakpoint(FScanner, Bkpt, Breakpoint, Locations))
+        FProcess.NotifyBreakpointLocations(Breakpoint, Locations);
+    }
   } else if (Class == "thread-group-created") {
     // GDB's group ids ("i1") are not process ids and read as 0.
     if (Results()) {
@@ -619,6 +638,18 @@ bool TGDBOutputParser::ProcessLogStream() {
   // that way wait under the echoed text.
   TGDBResult* WaitObject = FProcess.RemoveWaitObject(Text);
   if (!WaitObject) {
+    // GDB accepts more watchpoints than the hardware holds and finds out at
+    // the next resume, which it then refuses: that one is not placed.
+    constexpr std::string_view NoWatchSlot = "Could not insert hardware watchpoint ";
+    if (!FIsLLDB && Text.starts_with(NoWatchSlot)) {
+      const std::string_view Rest = std::string_view(Text).substr(NoWatchSlot.size());
+      const size_t End = Rest.find('.');
+      const Integer Watchpoint = MIStrToIntDef(Rest.substr(0, End), -1);
+      if (Watchpoint != -1) {
+        Log(etError, std::string(NoWatchSlot) + std::string(Rest.substr(0, End)) + ".");
+        FProcess.NotifyBreakpointLocations(Watchpoint, {});
+      }
+    }
     if (FProcess.IsWindows() && FProcess.IsAttachMode() && Text.find(AttachFailed) != std::string::npos)
       FProcess.NotifyProcessExited(-1, "");
     if (FIsLLDB && Text.starts_with("error: "))

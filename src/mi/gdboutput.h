@@ -32,6 +32,10 @@ bool DecodeConsoleResult(TGDBResult& Result, TMIScanner& Scanner);
 /// Reads "addr", "fullname" (else "file", else "from"), "line" and
 /// "original-location" among the results at the cursor.
 void ParseLocation(TMIScanner& Scanner, TGDBLocation& Location);
+/// Reads GDB's "bkpt" tuple (inner text Bkpt; the cursor just after it, on
+/// the location tuples GDB puts beside it): its number and the locations it
+/// resolved to, none while it is pending. False without a number.
+bool ReadGDBBreakpoint(TMIScanner& Scanner, std::string_view Bkpt, Integer& Number, TGDBLocationArray& Locations);
 /// Reads the location of the "frame" tuple (DummyLocation without one) and
 /// "thread-id" (-1 without one) among the results at the cursor.
 void ParseStopFrame(TMIScanner& Scanner, TGDBLocation& Location, Integer& ThreadId);

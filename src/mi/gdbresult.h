@@ -173,6 +173,12 @@ public:
   Integer FBreakpoint = -1;
   TAddressArray FAddresses;
   TGDBLocation FLocation;
+  /// Each location of a breakpoint GDB resolved to several places, beside
+  /// FAddresses.
+  TGDBLocationArray FLocations;
+  /// GDB keeps the breakpoint for a file, function or library it does not
+  /// know yet ("<PENDING>"): no error, but nothing is inserted.
+  bool FPending = false;
 };
 
 class TBreakWatchResult : public TGDBResult {

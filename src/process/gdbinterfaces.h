@@ -234,7 +234,15 @@ public:
   virtual UInt64 GetBaseAddress() = 0;
   virtual TGDBModule GetModule(Integer Id) = 0;
 
-  // Added after the operations above.
+  // Added after the slots above, which never move.
+  /// A breakpoint on every function of that name, in the program and in the
+  /// libraries it loads (later ones included); reported as a source one.
+  virtual void CreateFunctionBreakpoint(const std::string& FunctionName,
+                                        const TIntfPtr<IGDBBreakpointListener>& Listener) = 0;
+  /// Watches Size bytes (1 to 8, or more where the debugger splits them) at
+  /// Address; LLDB watches what CreateWatchBreakpoint does.
+  virtual void CreateSizedWatchBreakpoint(UInt64 Address, Integer Size, bool ReadFlag, bool AccessFlag,
+                                          const TIntfPtr<IGDBBreakpointListener>& Listener) = 0;
   /// The start of the function that holds Address, as its disassembly
   /// tells; 0 when unknown.
   virtual UInt64 GetFunctionStart(UInt64 Address) = 0;

@@ -41,8 +41,7 @@ public:
   ~TGDBProcess() override;
 
   // --- Start-up ----------------------------------------------------------
-  /// Starts the debugger and sends the settings for its kind. Raises
-  /// ENonAIRException when the kernel does not start.
+  /// Starts the debugger and its kind's settings; ENonAIRException when it fails.
   void Start();
   TIntfPtr<IGDBProcess> CreateProcess(const std::string& ExeName, const std::string& Arguments,
                                       const std::string& WorkingDir);
@@ -52,11 +51,9 @@ public:
   Int64 GetKernelCapabilities() { return FKernel->GetCapabilities(); }
   void SetKernelCapabilites(Int64 Value) { FKernel->SetCapabilites(Value); }
 
-  // --- Requests ----------------------------------------------------------
   /// Writes one command line without waiting; true when it was written.
   bool ProcessAsyncRequest(const std::string& Request) { return FRequests.Send(Request); }
-  /// Writes the line and waits for the reply to fill Result; true when the
-  /// line was written (read Result's FError and FTimeOut for the outcome).
+  /// Writes the line, awaits the reply in Result; true when written (then see FError, FTimeOut).
   bool ProcessSyncRequest(const std::string& Key, const std::string& Request, TGDBResult& Result) {
     return FRequests.SendAndWait(Key, Request, Result);
   }
@@ -95,6 +92,7 @@ public:
   bool IsDying() override { return FDying; }
   Integer GetModuleId(const std::string& Name) override { return FModules.GetModuleId(Name); }
   void NotifyCommandRefused(const std::string& Message) override;
+  void NotifyBreakpointLocations(Integer Breakpoint, const TGDBLocationArray& Locations) override;
 
   // --- IGDBProcess ---------------------------------------------------------
   void CreateSourceBreakpoint(const std::string& FileName, Integer Line,
@@ -135,7 +133,9 @@ public:
   UInt64 GetBaseAddress() override { return FBaseAddress; }
   TGDBModule GetModule(Integer Id) override { return FModules.Current(Id); }
   UInt64 GetFunctionStart(UInt64 Address) override;
-
+  void CreateFunctionBreakpoint(const std::string& Name, const TIntfPtr<IGDBBreakpointListener>& Listener) override;
+  void CreateSizedWatchBreakpoint(UInt64 Address, Integer Size, bool ReadFlag, bool AccessFlag,
+                                  const TIntfPtr<IGDBBreakpointListener>& Listener) override;
   bool CanSetRunToMainBreakpoint() const { return FBreakOnMain != nullptr; } ///< run-to-main breakpoint placed
   TGDBThreadTable& Threads() { return *FThreads; }
   TGDBRegisterIds& Registers() { return *FRegisters; }
@@ -148,8 +148,7 @@ public:
 protected:
   /// Stops the debugger's reading and awaits the output thread.
   void BeforeDestruction() override;
-  /// Runs Delivery on the IDE's main thread (at once when called there),
-  /// only while this process still exists, under the live-process lock.
+  /// Runs Delivery on the main thread (at once there) while the process lives, under its lock.
   void DeferIfLive(std::function<void()> Delivery);
 
   std::atomic<bool> FAlive{false};
@@ -164,28 +163,30 @@ private:
   void SetProgramEnvironment();
   void NotifyFatalError();
   void NotifyInternalError(const std::string& Message);
-  /// Stops a synchronous target that the IDE does not hear of; true when
-  /// this call paused it; Aborted when the pause failed or one was running.
+  /// Pauses a synchronous target unheard; true when this call paused it; Aborted when it failed.
   bool SyncTargetPause(bool& Aborted, bool FatalOnExpiry);
   void ASyncTargetResume(); ///< resumes an asynchronous target paused inside the process, unheard
   TGDBLanguage GetCurrentLanguage();
-  /// A signal (tsrSignal) or language exception (tsrExceptRaised) stopped
-  /// the program: an Expected one is a plain stop, else the IDE decides.
+  /// A signal or language exception stopped it: an Expected one is a plain stop, else the IDE decides.
   void NotifyInterruption(const TGDBException& Event, Integer ThreadId, bool Expected, TThreadStopReason Reason);
 
   // Defined in src/inspect beside the components they use.
   void MakeInspectComponents();
-  /// The program runs on: forgets the stop and the caches it made stale;
-  /// the number of the thread that was stopped.
+  /// The program runs on: forgets the stop and stale caches; the thread that was stopped.
   Integer ForgetStop();
-  /// The stop's main-thread part: refreshes the threads, records the stop on
-  /// the thread and tells the IDE.
+  /// The stop's main-thread part: refreshes the threads, records the stop, tells the IDE.
   void DoNotifyProcessSuspended(const TGDBLocation& Location, Integer ThreadId, TThreadStopReason Reason);
   void SetCurrentSuspendedThread(Integer ThreadId, const TGDBLocation& Location);
   void EnsureThreadCreated(Integer ThreadId);
   void NotifyAllThreadExited();
   /// A module came or went: the line addresses cached may have moved.
   void ForgetLineAddresses();
+  /// Runs Work with a running synchronous target paused, unheard; not at all when the pause fails.
+  void WhilePaused(const std::function<void()>& Work);
+  /// Sends the insert (or Watch) Create builds; tells Listener what came of it.
+  void InsertBreakpoint(const std::function<std::string(TGDBCommand&, std::string&)>& Create,
+                        const TIntfPtr<IGDBBreakpointListener>& Listener, bool Watch = false);
+  void InstallExceptionBreakpoints(); ///< the language runtimes' raise, throw and catch, once each
 
   TIntfPtr<IGDBProcessListener> FProcessListener;
   std::atomic<TGDBLanguage> FLanguage;
@@ -210,11 +211,10 @@ private:
   std::string FLaunchErrorMessage;
   std::atomic<Integer> FMaxChildrenCount{-1}, FPid{-1}, FLastSuspendedThreadId{-1};
   std::atomic<UInt64> FBaseAddress{0};
-  std::atomic<bool> FDying{false}, FExiting{false}, FStarted{false}, FStoppedAtEntryPoint{false};
-  std::atomic<bool> FSuspended{false}, FSuspending{false}, FResuming{false}, FEvaluating{false};
-  std::atomic<bool> FUpdateThreadState{true}, FAsyncTarget{false}, FAttachMode{false};
-  std::atomic<bool> FAttachNotifySuspended{false}, FInternalPause{false}, FInternalResume{false};
-  std::atomic<bool> FInternalError{false}, FRestarting{false};
+  std::atomic<bool> FDying{false}, FExiting{false}, FStarted{false}, FStoppedAtEntryPoint{false}, FSuspended{false};
+  std::atomic<bool> FSuspending{false}, FResuming{false}, FEvaluating{false}, FUpdateThreadState{true};
+  std::atomic<bool> FAsyncTarget{false}, FAttachMode{false}, FAttachNotifySuspended{false}, FInternalPause{false};
+  std::atomic<bool> FInternalResume{false}, FInternalError{false}, FRestarting{false};
 };
 
 } // namespace midebug

@@ -166,6 +166,11 @@ void TGDBProcess::NotifyProcessFaulted(const std::string& Message) {
 }
 
 void TGDBProcess::NotifyCommandRefused(const std::string& Message) {
+  // GDB reports a resume running first and aborts it when it cannot insert
+  // a breakpoint or watchpoint: the program never left its stop.
+  constexpr std::string_view ResumeAborted = "Command aborted.";
+  if (!FSuspended && Message == ResumeAborted && FLastSuspendedThreadId != -1)
+    FSuspended = true;
   if (!FSuspended) {
     NotifyProcessFaulted(Message);
     return;

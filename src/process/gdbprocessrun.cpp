@@ -117,8 +117,7 @@ void TGDBProcess::Detach() {
 }
 
 void TGDBProcess::SetOsException(const std::string& Signal, bool Stop, bool Pass) {
-  // The language-exception breakpoints that LLDB and Linux targets install
-  // first come with the breakpoint operations.
+  InstallExceptionBreakpoints();
   const bool Linux = FKernel->IsLinux();
   const bool CannotInterruptByCommand = !FAsyncTarget || !FKernel->SupportExecInterruptCommand();
   // Pause stops the program with this signal when the interrupt command

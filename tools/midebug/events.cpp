@@ -44,9 +44,7 @@ void TCliListener::SignalReceived(bool& ShouldStop, Integer ThreadId, const TGDB
     FSession->OnSignal(ThreadId, SignalException);
 }
 void TCliListener::ExceptionRaised(bool& ShouldStop, Integer ThreadId, const TGDBException& LanguageException) {
-  ShouldStop = true;
-  if (FSession)
-    FSession->OnException(ThreadId, LanguageException);
+  ShouldStop = FSession ? FSession->OnException(ThreadId, LanguageException) : true;
 }
 void TCliListener::LogEvent(const TGDBLogEvent& Event) {
   if (FSession)
@@ -192,6 +190,7 @@ void TCliSession::OnSuspended(Integer ThreadId) {
   Event.update(LocationJson(Location));
   std::string Text = Why + " in thread " + std::to_string(ThreadId) + ": " +
                      (Header.empty() ? LocationText(Location) : FrameText(-1, Header, Location));
+  DescribeHit(Event, Text);
   const std::string Source = SourceText(Location);
   if (!Source.empty()) {
     Event["text"] = FSources.Line(Location.Source, Location.Line);
@@ -282,14 +281,6 @@ void TCliSession::OnSignal(Integer ThreadId, const TGDBException& Signal) {
   nlohmann::json Event = {{"event", "signal"}, {"thread", ThreadId}, {"name", Signal.Name}, {"description", Signal.Desc}};
   Event.update(LocationJson(Signal.Location));
   FOutput.Emit(Event, "");
-}
-
-void TCliSession::OnException(Integer ThreadId, const TGDBException& Exception) {
-  nlohmann::json Event = {
-      {"event", "exception"}, {"thread", ThreadId}, {"name", Exception.Name}, {"description", Exception.Desc}};
-  Event.update(LocationJson(Exception.Location));
-  FOutput.Emit(Event, "Exception " + Exception.Name + (Exception.Desc.empty() ? "" : ": " + Exception.Desc) +
-                          " in thread " + std::to_string(ThreadId));
 }
 
 void TCliSession::OnLog(const TGDBLogEvent& Event) {

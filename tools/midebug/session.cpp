@@ -99,6 +99,19 @@ const std::vector<TCliSession::TCommandEntry>& TCliSession::Commands() {
       {"info registers", &TCliSession::CmdInfoRegisters, 1, "info registers [general|fpu|sse|NAME]",
        "the registers of the current thread"},
       {"set register", &TCliSession::CmdSetRegister, 2, "set register NAME VALUE", "write a register"},
+      {"break", &TCliSession::CmdBreak, 1, "break FILE:LINE | FUNCTION | *ADDRESS", "set a breakpoint"},
+      {"tbreak", &TCliSession::CmdBreak, 1, "tbreak FILE:LINE | FUNCTION | *ADDRESS",
+       "set a breakpoint deleted at its first stop"},
+      {"watch", &TCliSession::CmdWatch, 3, "watch [-r|-a] ADDRESS [SIZE]",
+       "stop where the memory is written (-r read, -a either); SIZE bytes, else an int"},
+      {"delete", &TCliSession::CmdDelete, 1000, "delete [N...]", "delete breakpoints (all without N)"},
+      {"enable", &TCliSession::CmdEnable, 1000, "enable N...", "enable breakpoints"},
+      {"disable", &TCliSession::CmdEnable, 1000, "disable N...", "disable breakpoints"},
+      {"info", &TCliSession::CmdInfo, 1, "info breakpoints", "the breakpoints with their hit counts"},
+      {"ignore", &TCliSession::CmdIgnore, 2, "ignore N COUNT", "let breakpoint N pass its next COUNT hits"},
+      {"catch", &TCliSession::CmdCatch, 1, "catch throw|catch|raise",
+       "stop where a C++ exception is thrown or caught, or a Pascal one raised"},
+      {"uncatch", &TCliSession::CmdCatch, 1, "uncatch [throw|catch|raise]", "stop catching (all without a kind)"},
       {"help", &TCliSession::CmdHelp, 0, "help", "this list"},
   };
   return Table;
@@ -178,6 +191,7 @@ void TCliSession::Load(TGDBLanguage Language, TGDBCPU CPU) {
   FThreads.clear();
   FCurrentThread = -1;
   FCurrentFrame = 0;
+  RestoreBreakpoints();
 }
 
 bool TCliSession::Execute(const std::string& Line) {

@@ -10,6 +10,8 @@
 #include <chrono>
 #include <cstdint>
 #include <functional>
+#include <map>
+#include <memory>
 #include <set>
 #include <string>
 #include <vector>
@@ -79,7 +81,8 @@ public:
   void OnThreadExited(Integer ThreadId);
   void OnModule(const TGDBModule& Module, bool Loaded);
   void OnSignal(Integer ThreadId, const TGDBException& Signal);
-  void OnException(Integer ThreadId, const TGDBException& Exception);
+  /// True when the session stops at it (see 'catch').
+  bool OnException(Integer ThreadId, const TGDBException& Exception);
   void OnLog(const TGDBLogEvent& Event);
   void OnInternalError(const std::string& Message);
   void OnDebuggerLost();
@@ -122,6 +125,39 @@ private:
 
   /// Has the debugger load the program (again); raises when it cannot.
   void Load(TGDBLanguage Language, TGDBCPU CPU);
+  // --- Breakpoints (breakpointcommands.cpp) ----------------------------------
+public:
+  struct TCliBreakpoint;
+  /// A hit of the session's breakpoint Id; the answer is whether to stop.
+  bool OnBreakpointHit(Integer Id);
+  void OnBreakpointVerified(Integer Id, bool Verified, Integer Number, const TGDBLocation& Location);
+
+private:
+  void CmdBreak(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdWatch(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdDelete(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdEnable(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdInfo(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdIgnore(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdCatch(const std::string& Name, const std::vector<std::string>& Arguments);
+  using TPlace = std::function<void(IGDBProcess& Process, const TIntfPtr<IGDBBreakpointListener>& Listener)>;
+  /// Registers a new breakpoint of the session and has Place set it.
+  void NewBreakpoint(const std::string& Kind, const std::string& Where, bool Temporary, TPlace Place);
+  /// Sets every breakpoint and catch again in a program loaded anew.
+  void RestoreBreakpoints();
+  /// The breakpoint named by Text, or null with the reason printed.
+  TCliBreakpoint* FindBreakpoint(const std::string& Name, const std::string& Text);
+  /// "Breakpoint N, " for the stop that the hit of breakpoint N caused.
+  void DescribeHit(nlohmann::json& Event, std::string& Text);
+
+  std::map<Integer, std::shared_ptr<TCliBreakpoint>> FBreakpoints;
+  Integer FNextBreakpoint = 1;
+  /// The breakpoint whose hit stopped the program, until the stop is told.
+  Integer FStoppedBy = -1;
+  /// The kinds of language exception the session stops at: "throw", "catch", "raise".
+  std::set<std::string> FCatches;
+  // --- End of breakpoints ------------------------------------------------------
+
   /// True when the program can be resumed or stepped; otherwise prints why.
   bool RequireStopped(const std::string& Name);
   /// True when 'run' or 'start' may start the program; otherwise prints why.

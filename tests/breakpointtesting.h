@@ -1,0 +1,111 @@
+#pragma once
+/// \file
+/// What the breakpoint and exception tests share: a breakpoint listener that
+/// records what it hears, and a fixture that debugs a program through the
+/// "local" profile.
+
+#include "midebug.h"
+#include "process/gdbprocess.h"
+#include "testlistener.h"
+#include "testsupport.h"
+
+#include <gtest/gtest.h>
+
+#include <fstream>
+#include <mutex>
+#include <string>
+#include <vector>
+
+namespace midebug::test {
+
+/// The IDE's side of one breakpoint: what it heard, and Stop as its answer.
+class TBreakpointRecorder : public TInterfaced<IGDBBreakpointListener> {
+public:
+  struct TVerdict {
+    bool Verified = false;
+    Integer Breakpoint = -1;
+    TGDBLocation Location;
+  };
+  std::atomic<bool> Stop{true};
+  std::atomic<Integer> Hits{0}, LastThread{-1};
+
+  void BreakpointHits(bool& ShouldStop, Integer ThreadId, TGDBLocation& /*Location*/) override {
+    ShouldStop = Stop;
+    LastThread = ThreadId;
+    ++Hits;
+  }
+  void BreakpointVerified(bool Verified, Integer Breakpoint, const TGDBLocation& Location) override {
+    std::lock_guard Guard(FLock);
+    FVerdicts.push_back({Verified, Breakpoint, Location});
+  }
+  std::vector<TVerdict> Verdicts() const {
+    std::lock_guard Guard(FLock);
+    return FVerdicts;
+  }
+  TVerdict Last() const {
+    std::lock_guard Guard(FLock);
+    return FVerdicts.empty() ? TVerdict{} : FVerdicts.back();
+  }
+
+private:
+  mutable std::mutex FLock;
+  std::vector<TVerdict> FVerdicts;
+};
+
+/// The line of a debuggee's source marked "// line:Marker"; 0 without one.
+inline Integer MarkedLine(const std::string& FileName, const std::string& Marker) {
+  std::ifstream Source(DebuggeeSource(FileName));
+  std::string Text;
+  for (Integer Line = 1; std::getline(Source, Text); ++Line)
+    if (Text.find("line:" + Marker) != std::string::npos)
+      return Line;
+  return 0;
+}
+
+class TDebugFixture : public ::testing::Test {
+protected:
+  void SetUp() override { SetMainThread(); }
+  void TearDown() override {
+    Process = nullptr;
+    ProcessPending();
+  }
+  void Launch(const std::string& Program, TGDBLanguage Language = glC, const std::string& Arguments = "") {
+    ASSERT_FALSE(Program.empty());
+    Process = TGDBProcessManager::CreateProcess(Listener, Program, Arguments, Scratch.Path(), "local", "Linux64",
+                                                Language, gcAMD64, "gdb");
+    ASSERT_TRUE(Process);
+  }
+  void LaunchToMain(const std::string& Program, const std::string& Arguments = "") {
+    Launch(Program, glC, Arguments);
+    ASSERT_TRUE(Process->SetRunToMainBreakpoint());
+    Process->Run();
+    ASSERT_TRUE(NextStop());
+  }
+  /// Pumps until the IDE has heard one more stop than before.
+  bool NextStop() {
+    const size_t Before = StopsSeen;
+    const bool Stopped = Listener->PumpUntil([&] { return Listener->CountOf("Suspended(") > Before; });
+    StopsSeen = Listener->CountOf("Suspended(");
+    return Stopped;
+  }
+  bool ResumeToStop() { return Process->Resume(), NextStop(); }
+  TIntfPtr<IGDBThread> Stopped() { return Process->GetThread(Process->GetSuspendedThreadId()); }
+  TGDBLocation StopLocation() { return Stopped()->GetCurrentLocation(); }
+  TThreadStopReason StopReason() { return Stopped()->GetStopReason(); }
+  /// The value of a C expression in the stopped program, as a number.
+  UInt64 AddressOf(const std::string& Expression) {
+    TDataEvaluateExpressionResult Value;
+    auto& Requests = static_cast<TGDBProcess*>(Process.get())->Requests();
+    if (!Requests.Ask(Value, &TGDBCommand::CreateDataEvaluateExpressionCommand, Expression))
+      return 0;
+    return std::stoull(Value.FValue.substr(Value.FValue.find("0x")), nullptr, 16);
+  }
+  static TIntfPtr<TBreakpointRecorder> Recorder() { return TIntfPtr<TBreakpointRecorder>(new TBreakpointRecorder); }
+
+  TScratchDir Scratch;
+  TIntfPtr<TTestListener> Listener{new TTestListener};
+  TIntfPtr<IGDBProcess> Process;
+  size_t StopsSeen = 0;
+};
+
+} // namespace midebug::test

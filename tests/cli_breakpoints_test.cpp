@@ -1,0 +1,144 @@
+// The console debugger's breakpoint, watchpoint and exception commands, run
+// in batch mode with JSON output against the real GDB.
+
+#include "breakpointtesting.h"
+
+#include <nlohmann/json.hpp>
+
+#include <cstdio>
+#include <sstream>
+
+namespace midebug {
+namespace {
+
+using nlohmann::json;
+using test::Debuggee;
+
+std::string Quote(const std::string& Text) { return "'" + Text + "'"; }
+
+/// The JSON objects one batch run printed.
+class TBatch {
+public:
+  TBatch(const test::TScratchDir& Scratch, const std::string& Arguments, const std::string& Commands) {
+    const std::string Input = Scratch.WriteFile("commands.txt", Commands);
+    const std::string Output = Scratch.Path() + "/stdout.txt";
+    const std::string Command = "cd " + Quote(Scratch.Path()) + " && " + Quote(MIDEBUG_CLI) +
+                                " --batch --json --wait 20 " + Arguments + " < " + Quote(Input) + " > " +
+                                Quote(Output) + " 2>/dev/null";
+    Status = std::system(Command.c_str());
+    std::ifstream Lines(Output);
+    for (std::string Line; std::getline(Lines, Line);) {
+      Text += Line + "\n";
+      json Object = json::parse(Line, nullptr, false);
+      if (!Object.is_discarded())
+        Objects.push_back(std::move(Object));
+    }
+  }
+  /// Every object whose Key is Value, in order.
+  std::vector<json> All(const std::string& Key, const std::string& Value) const {
+    std::vector<json> Found;
+    for (const json& Object : Objects)
+      if (Object.value(Key, "") == Value)
+        Found.push_back(Object);
+    return Found;
+  }
+  std::vector<json> Objects;
+  std::string Text;
+  /// A batch with a failed command ends with a failure.
+  int Status = -1;
+};
+
+Integer Line(const std::string& File, const std::string& Marker) { return test::MarkedLine(File, Marker); }
+
+class CliBreakpoints : public ::testing::Test {
+protected:
+  test::TScratchDir Scratch;
+};
+
+TEST_F(CliBreakpoints, BreakpointsStopSayWhichCountHitsAndFollowIgnoreEnableDisableAndDelete) {
+  const std::string Bump = "breakpoints.c:" + std::to_string(Line("breakpoints.c", "bump-add"));
+  const TBatch Run(Scratch, Quote(Debuggee("breakpoints")) + " 3",
+                   "break " + Bump + "\ntbreak main\nbreak nosuch.c:3\nrun\ninfo breakpoints\nignore 1 1\ncontinue\n"
+                   "disable 1\nenable 1\ncontinue\ninfo breakpoints\ndelete 1\ncontinue\n");
+  const auto Stops = Run.All("event", "stopped");
+  ASSERT_EQ(Stops.size(), 3u) << Run.Text;
+  EXPECT_EQ(Stops[0]["breakpoint"], 2);
+  EXPECT_EQ(Stops[1]["breakpoint"], 1);
+  EXPECT_EQ(Stops[1]["line"], Line("breakpoints.c", "bump-add"));
+  EXPECT_EQ(Stops[2]["breakpoint"], 1);
+  const auto Lists = Run.All("answer", "info");
+  // The temporary one is gone once it stopped; the missing file is pending.
+  ASSERT_EQ(Lists.at(0)["breakpoints"].size(), 2u);
+  EXPECT_EQ(Lists.at(0)["breakpoints"][1]["verified"], false);
+  EXPECT_EQ(Lists.at(1)["breakpoints"][0]["hits"], 3);
+  EXPECT_EQ(Lists.at(1)["breakpoints"][0]["locations"].size(), 1u);
+  EXPECT_EQ(Run.All("event", "exited").at(0)["code"], 1);
+}
+
+TEST_F(CliBreakpoints, WatchStopsWhereTheWatchedBytesAreWrittenAndSaysWhichWatchpoint) {
+  // GDB runs programs at the same place every time: the global's address is
+  // its offset in the file plus that base.
+  FILE* Symbols = popen(("nm " + Quote(Debuggee("breakpoints")) + " | grep ' counter$'").c_str(), "r");
+  ASSERT_NE(Symbols, nullptr);
+  unsigned long long Offset = 0;
+  ASSERT_EQ(std::fscanf(Symbols, "%llx", &Offset), 1);
+  pclose(Symbols);
+  std::ostringstream Address;
+  Address << "0x" << std::hex << (0x555555554000ull + Offset);
+  const TBatch Run(Scratch, Quote(Debuggee("breakpoints")) + " 1",
+                   "start\nwatch " + Address.str() + " 8\nwatch -r " + Address.str() + " 8\ndelete 2\ncontinue\n" +
+                       "continue\nwatch\nwatch -a 0x10 zero\n");
+  const auto Stops = Run.All("event", "stopped");
+  ASSERT_EQ(Stops.size(), 3u) << Run.Text;
+  EXPECT_TRUE(Stops[1]["breakpoint"] == 1 && Stops[2]["breakpoint"] == 1);
+  EXPECT_EQ(Stops[2]["line"], Line("breakpoints.c", "upper-read"));
+  const auto Watches = Run.All("answer", "watch");
+  ASSERT_EQ(Watches.size(), 4u);
+  EXPECT_EQ(Watches[0]["verified"], true);
+  EXPECT_EQ(Watches[2]["error"], "usage: watch [-r|-a] ADDRESS [SIZE]");
+  EXPECT_TRUE(Watches[3].contains("error"));
+}
+
+TEST_F(CliBreakpoints, CatchStopsAtExceptionsNamedByTheirTypeAndMessageAndUncatchLetsThemGo) {
+  const TBatch Cpp(Scratch, Quote(Debuggee("throws")) + " 1", "catch throw\nrun\nuncatch\ncontinue\n");
+  const auto Thrown = Cpp.All("event", "exception");
+  ASSERT_EQ(Thrown.size(), 1u) << Cpp.Text;
+  EXPECT_TRUE(Thrown[0]["name"] == "std::runtime_error" && Thrown[0]["kind"] == "throw");
+  EXPECT_EQ(Thrown[0]["line"], Line("throws.cpp", "throw"));
+  EXPECT_EQ(Cpp.All("event", "stopped")[0]["reason"], "exception");
+  EXPECT_EQ(Cpp.All("event", "exited")[0]["code"], 0);
+
+  const TBatch Pascal(Scratch, Quote(Debuggee("raises")), "catch raise\nrun\ncontinue\ncontinue\n");
+  const auto Raised = Pascal.All("event", "exception");
+  ASSERT_EQ(Raised.size(), 2u) << Pascal.Text;
+  EXPECT_TRUE(Raised[0]["name"] == "ETooDeep" && Raised[0]["description"] == "depth 12 is too deep");
+  EXPECT_EQ(Raised[1]["name"], "TPlain");
+}
+
+TEST_F(CliBreakpoints, WrongArgumentsGetAClearErrorAndTheSessionGoesOn) {
+  const TBatch Run(Scratch, Quote(Debuggee("breakpoints")),
+                   "break *0xZZ\nbreak a.c:x\ndelete 7\nignore 9 1\ninfo frobs\ncatch bogus\n"
+                   "break main\ninfo breakpoints\n");
+  const std::pair<const char*, const char*> Expected[] = {
+      {"break", "not an address: 0xZZ"},
+      {"break", "not a line: x"},
+      {"delete", "no breakpoint 7"},
+      {"ignore", "no breakpoint 9"},
+      {"info", "usage: info breakpoints"},
+      {"catch", "usage: catch throw|catch|raise"},
+  };
+  std::vector<json> Errors;
+  for (const json& Object : Run.Objects)
+    if (Object.contains("error"))
+      Errors.push_back(Object);
+  ASSERT_EQ(Errors.size(), std::size(Expected)) << Run.Text;
+  for (size_t Index = 0; Index < Errors.size(); ++Index) {
+    EXPECT_EQ(Errors[Index]["answer"], Expected[Index].first);
+    EXPECT_EQ(Errors[Index]["error"], Expected[Index].second);
+  }
+  EXPECT_EQ(Run.All("answer", "info").back()["breakpoints"][0]["verified"], true);
+  EXPECT_NE(Run.Status, 0);
+}
+
+} // namespace
+} // namespace midebug
