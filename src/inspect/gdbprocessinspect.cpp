@@ -11,14 +11,6 @@ void TGDBProcess::CreateWatchBreakpoint(UInt64, bool, bool, const TIntfPtr<IGDBB
 void TGDBProcess::DeleteBreakpoint(Integer) {}
 void TGDBProcess::EnableBreakpoint(Integer) {}
 void TGDBProcess::DisableBreakpoint(Integer) {}
-void TGDBProcess::GetSourceLines(const std::string&, TIntegerArray& Lines) { Lines.clear(); }
-bool TGDBProcess::FindSourceLine(UInt64, UInt64&, Integer&, Integer&, Integer&) { return false; }
-TAddressArray TGDBProcess::FindSourceAddress(Integer, Integer) { return {}; }
-bool TGDBProcess::FindSourceLocation(const std::string&, Integer, TGDBLocation&) { return false; }
-bool TGDBProcess::SetNewEip(UInt64) { return false; }
-Integer TGDBProcess::GetFileIndex(const std::string&) { return 0; }
-std::string TGDBProcess::GetFileName(Integer) { return {}; }
-bool TGDBProcess::SetFileName(Integer, const std::string&) { return false; }
 Integer TGDBProcess::GetMemory(UInt64, void*, Integer) { return 0; }
 Integer TGDBProcess::SetMemory(UInt64, const void*, Integer) { return 0; }
 TIntfPtr<IGDBDisassemble> TGDBProcess::GetDisassembler() { return nullptr; }

@@ -154,7 +154,7 @@ TStringArray TGDBThread::GetCallParams(Integer Index) {
   return Frame ? Frame->Params : TStringArray();
 }
 
-Integer TGDBThread::GetFileIndex(const std::string& FileName) { return FProcess->GetFileIndex(FileName); }
+Integer TGDBThread::GetFileIndex(const std::string& FileName) { return FProcess->AddFileName(FileName); }
 
 // Registers, evaluation, inspectors and disassembly come with operations of
 // their own; until then they report failure.

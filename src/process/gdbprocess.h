@@ -53,8 +53,7 @@ public:
   void SetKernelCapabilites(Int64 Value) { FKernel->SetCapabilites(Value); }
 
   // --- Requests ----------------------------------------------------------
-  /// Writes one command line without waiting; true when it was written.
-  bool ProcessAsyncRequest(const std::string& Request) { return FRequests.Send(Request); }
+  bool ProcessAsyncRequest(const std::string& Request) { return FRequests.Send(Request); } ///< written, unawaited
   /// Writes the line and waits for the reply to fill Result; true when the
   /// line was written (read Result's FError and FTimeOut for the outcome).
   bool ProcessSyncRequest(const std::string& Key, const std::string& Request, TGDBResult& Result) {
@@ -111,6 +110,7 @@ public:
   bool FindSourceLocation(const std::string& FileName, Integer Line, TGDBLocation& Location) override;
   bool SetNewEip(UInt64 Address) override;
   Integer GetFileIndex(const std::string& FileName) override;
+  Integer AddFileName(const std::string& FileName); ///< GetFileIndex that adds a name it does not know
   std::string GetFileName(Integer FileIndex) override;
   bool SetFileName(Integer FileIndex, const std::string& FileName) override;
   Integer GetMemory(UInt64 Address, void* Buffer, Integer Size) override;

@@ -1,0 +1,266 @@
+// Source lines and code addresses: the file index table, the line of an
+// address, the addresses of a line, the lines of a file, and moving the
+// next statement.
+
+#include "inspect/gdbfiletable.h"
+#include "inspect/gdblinecache.h"
+#include "inspect/gdbthreadtable.h"
+#include "process/gdbprocess.h"
+
+#include <algorithm>
+#include <cstdio>
+#include <optional>
+
+namespace midebug {
+
+namespace {
+
+/// Windows targets list a file's lines in chunks of this many.
+constexpr Integer WindowsLineChunk = 1024;
+
+/// What "info line" is asked about: an address, or a file's line.
+struct TLineQuestion {
+  std::optional<UInt64> Address;
+  std::string File;
+  Integer Line = 0;
+};
+
+/// Asks the debugger for the line and code range of Question: LLDB answers
+/// "-data-info-line", GDB (which has no such command) its console "info
+/// line". False, with GDB's words in FMessage when it gave some, unless a
+/// code range came back.
+bool AskInfoLine(TGDBProcess& Process, TGDBLineCache& Lines, const TLineQuestion& Question,
+                 TCLInfoLineResult& Answer) {
+  TGDBRequestEngine& Requests = Process.Requests();
+  const bool LLDB = Process.IsLLDB();
+  TDataInfoLineResult LLDBReply;
+  TDataInfoLineResult& Reply = LLDB ? LLDBReply : Answer;
+  // GDB names a file as it was compiled, often relative to a directory we
+  // do not know, unless told to name it in full; the answer to this comes
+  // before the question's.
+  if (!LLDB && !Lines.FFullFileNames.exchange(true))
+    Requests.Fire(&TGDBCommand::CreateGDBSetCommand, "filename-display", "absolute");
+  const bool Found = Requests.Ask(Reply, [&](TGDBCommand& Builder, std::string& Token) {
+    if (LLDB)
+      return Question.Address ? Builder.CreateDataInfoLineCommand(Token, *Question.Address)
+                              : Builder.CreateDataInfoLineCommand(Token, Question.File, Question.Line);
+    return Question.Address ? Builder.CreateCLInfoLineCommand(Token, *Question.Address)
+                            : Builder.CreateCLInfoLineCommand(Token, Question.File, Question.Line);
+  });
+  if (LLDB) {
+    Answer.FSource = Reply.FSource;
+    Answer.FLine = Reply.FLine;
+    Answer.FStartAddr = Reply.FStartAddr;
+    Answer.FEndAddr = Reply.FEndAddr;
+  }
+  if (Answer.FMessage.empty())
+    Answer.FMessage = Reply.FErrorMessage;
+  return Found && Reply.GetSize() > 0;
+}
+
+/// The name of the program counter in the debugger's register names.
+std::string_view PCRegisterName(TGDBCPU CPU) {
+  switch (CPU) {
+  case gcARM32:
+  case gcARM64:
+    return "pc";
+  case gcAMD64:
+    return "rip";
+  case gcIA32:
+    break;
+  }
+  return "eip";
+}
+
+std::string AddressText(UInt64 Address) {
+  char Text[24];
+  std::snprintf(Text, sizeof Text, "0x%llX", static_cast<unsigned long long>(Address));
+  return Text;
+}
+
+/// Writes Value to the register the debugger names Name, in the current
+/// thread's innermost frame, through GDB's MI register write.
+bool WriteGDBRegister(TGDBProcess& Process, std::string_view Name, UInt64 Value) {
+  TDataListRegisterNamesResult Names(Process.CPU(), "");
+  if (!Process.Requests().Ask(Names, &TGDBCommand::CreateDataListRegisterNames, std::vector<Integer>()))
+    return false;
+  const auto Found = std::find(Names.FNames.begin(), Names.FNames.end(), Name);
+  if (Found == Names.FNames.end())
+    return false;
+  const std::string Number = std::to_string(Found - Names.FNames.begin());
+  TGDBResult Written(ctDataWriteRegisterValues);
+  return Process.Requests().Ask(Written, [&](TGDBCommand& Builder, std::string& Token) {
+    return Builder.CreateMiCommand(ctDataWriteRegisterValues, Token) + " x " + Number + " " + AddressText(Value);
+  });
+}
+
+} // namespace
+
+// --- The file index table ------------------------------------------------------
+
+Integer TGDBProcess::AddFileName(const std::string& FileName) { return FFiles->AddFileName(FileName, IsWindows()); }
+Integer TGDBProcess::GetFileIndex(const std::string& FileName) { return FFiles->GetFileIndex(FileName, IsWindows()); }
+std::string TGDBProcess::GetFileName(Integer FileIndex) { return FFiles->GetFileName(FileIndex); }
+bool TGDBProcess::SetFileName(Integer FileIndex, const std::string& FileName) {
+  return FFiles->SetFileName(FileIndex, FileName);
+}
+
+// --- Lines and addresses ---------------------------------------------------------
+
+bool TGDBProcess::FindSourceLine(UInt64 Address, UInt64& StartAddr, Integer& Size, Integer& FileIndex,
+                                 Integer& Line) {
+  // GDB reports only the shared libraries as modules, not the program:
+  // the lowest module would bar the program's own code.
+  const bool Asked = Address >= FBaseAddress || !IsLLDB();
+  TInfoLine Found;
+  bool Known = Asked && FLines->FindInfoLine(Address, Found);
+  if (!Known && Asked) {
+    const UInt64 Epoch = FLines->InfoLineEpoch();
+    TCLInfoLineResult Answer;
+    if (AskInfoLine(*this, *FLines, {Address, {}, 0}, Answer) && Address >= Answer.FStartAddr &&
+        Address < Answer.FEndAddr) {
+      Found = {Answer.FStartAddr, Answer.FEndAddr, static_cast<Integer>(Answer.GetSize()), Answer.FLine,
+               AddFileName(Answer.FSource)};
+      FLines->SetInfoLine(Found, Epoch);
+      Known = true;
+    }
+  }
+  if (!Known)
+    Found = {Address, Address, 0, 0, 0};
+  StartAddr = Found.StartAddr;
+  Size = Found.Size;
+  FileIndex = Found.FileIndex;
+  Line = Found.Line;
+  return Known;
+}
+
+bool TGDBProcess::FindSourceLocation(const std::string& FileName, Integer Line, TGDBLocation& Location) {
+  Location = DummyLocation;
+  TCLInfoLineResult Answer;
+  if (FileName.empty() || Line < 1 ||
+      !AskInfoLine(*this, *FLines, {std::nullopt, TGDBFileTable::DebuggerName(FileName, IsWindows()), Line}, Answer))
+    return false;
+  Location = {Line, FileName, Answer.FStartAddr};
+  return true;
+}
+
+namespace {
+
+/// A file's lines with code, and their addresses when WithAddresses, in
+/// the debugger's order, line 0 (the end of a sequence) left out. Windows
+/// targets are asked in chunks; a debugger that ignores the chunk asked for
+/// and answers the whole table again ends the asking.
+bool ListLines(TGDBRequestEngine& Requests, bool Windows, const std::string& FileName, bool WithAddresses,
+               TIntegerArray& Lines, TAddressArray& Addresses) {
+  Lines.clear();
+  Addresses.clear();
+  bool Listed = false;
+  Integer Start = Windows ? 1 : -1;
+  for (;;) {
+    TSymbolListLinesResult Chunk(WithAddresses);
+    if (!Requests.Ask(Chunk, &TGDBCommand::CreateSymbolListLinesCommand, FileName, Start, WindowsLineChunk))
+      break;
+    Listed = true;
+    if (Windows && !Chunk.FLines.empty() && Chunk.FLines.back() < Start)
+      break;
+    for (size_t Index = 0; Index < Chunk.FLines.size(); ++Index) {
+      if (Chunk.FLines[Index] == 0)
+        continue;
+      Lines.push_back(Chunk.FLines[Index]);
+      if (WithAddresses)
+        Addresses.push_back(Index < Chunk.FAddresses.size() ? Chunk.FAddresses[Index] : 0);
+    }
+    if (!Windows || Chunk.FLines.size() < static_cast<size_t>(WindowsLineChunk))
+      break;
+    Start = Chunk.FLines.back() + 1;
+  }
+  return Listed;
+}
+
+} // namespace
+
+void TGDBProcess::GetSourceLines(const std::string& FileName, TIntegerArray& Lines) {
+  Lines.clear();
+  if (FileName.empty())
+    return;
+  bool Aborted = false;
+  const bool Paused = SyncTargetPause(Aborted, false);
+  if (Aborted)
+    return;
+  TAddressArray Unused;
+  ListLines(FRequests, IsWindows(), TGDBFileTable::DebuggerName(FileName, IsWindows()), false, Lines, Unused);
+  if (Paused && FAlive) {
+    FInternalResume = true;
+    Resume();
+    Integer Timeout = FRequests.SyncTimeout();
+    while (FResuming && FAlive && !FRequests.WaitForReplyTimeOut(Timeout, false)) {
+    }
+    FInternalResume = false;
+  }
+}
+
+TAddressArray TGDBProcess::FindSourceAddress(Integer FileIndex, Integer Line) {
+  TAddressArray Addresses;
+  if (FLines->FindLineAddress(FileIndex, Line, Addresses))
+    return Addresses;
+  // A Windows target's debugger finds a file by its bare name; GDB by the
+  // full one, which tells apart two files of one name.
+  const bool Windows = IsWindows();
+  const std::string Stored = GetFileName(FileIndex);
+  const std::string FileName =
+      Windows ? TGDBFileTable::BareName(Stored, true) : TGDBFileTable::DebuggerName(Stored, false);
+  if (FileName.empty())
+    return Addresses;
+  const UInt64 Epoch = FLines->LineAddressEpoch();
+  TIntegerArray AllLines;
+  TAddressArray AllAddresses;
+  if (!ListLines(FRequests, Windows, FileName, true, AllLines, AllAddresses) || (Windows && AllLines.empty()))
+    return Addresses;
+  FLines->SetLineAddress(FileIndex, AllLines, AllAddresses, Epoch);
+  for (size_t Index = 0; Index < AllLines.size(); ++Index)
+    if (AllLines[Index] == Line)
+      Addresses.push_back(AllAddresses[Index]);
+  return Addresses;
+}
+
+// --- Moving the next statement -----------------------------------------------------
+
+bool TGDBProcess::SetNewEip(UInt64 Address) {
+  const Integer ThreadId = FThreads->StoppedId();
+  if (!FAlive || !FSuspended || FResuming || ThreadId == -1)
+    return false;
+  if (!IsLLDB()) {
+    // The pc is written in the selected frame: an outer one would have its
+    // return address overwritten. Selecting the thread selects its
+    // innermost frame, and records where that stands.
+    FThreads->Select(ThreadId);
+    // Moving into another function would run its code on the wrong frame.
+    TCLInfoLineResult Here;
+    TCLInfoLineResult There;
+    AskInfoLine(*this, *FLines, {FThreads->StoppedLocation().Address, {}, 0}, Here);
+    AskInfoLine(*this, *FLines, {Address, {}, 0}, There);
+    if (There.FFunction.empty() || There.FFunction != Here.FFunction) {
+      NotifyLogEvent(CreateErrorLogEvent("Cannot move the next statement to " + AddressText(Address) +
+                                         ": it is not in the current function" +
+                                         (Here.FFunction.empty() ? "" : " " + Here.FFunction)));
+      return false;
+    }
+  }
+  const std::string_view PC = PCRegisterName(CPU());
+  if (IsLLDB()) {
+    FRequests.Fire(static_cast<std::string (TGDBCommand::*)(std::string&, const std::string&, UInt64)>(
+                       &TGDBCommand::CreateDataWriteRegisterValues),
+                   std::string(PC), Address);
+  } else if (!WriteGDBRegister(*this, PC, Address)) {
+    return false;
+  }
+  FLines->ForgetInfoLine();
+  FThreads->ResetCallStacks();
+  // GDB keeps the frames it unwound before the write and would step from
+  // the old line (GDB 13 then stops on an internal error): selecting the
+  // thread again makes it unwind afresh, and gives the new location.
+  FThreads->Select(ThreadId);
+  return true;
+}
+
+} // namespace midebug
