@@ -13,6 +13,7 @@
 #include <gtest/gtest.h>
 
 #include <filesystem>
+#include <set>
 
 namespace midebug {
 namespace {
@@ -139,6 +140,7 @@ TEST_F(SourceLinesTest, LinesAndAddressesOfACProgramMapBothWays) {
   EXPECT_EQ(Location.Address, Below[0]);
   EXPECT_EQ(Location.Source, "sourcelines.c");
   EXPECT_FALSE(Process->FindSourceLocation("sourcelines.c", 3, Location)) << "no code on line 3";
+  EXPECT_FALSE(Process->FindSourceLocation("sourcelines.c", 300, Location)) << "beyond the end";
   EXPECT_FALSE(Process->FindSourceLocation("nosuch.c", 3, Location));
   EXPECT_EQ(Location.Line, 0);
   EXPECT_EQ(Location.Address, 0u);
@@ -253,6 +255,68 @@ TEST_F(SourceLinesTest, CppAndPascalLinesMapAndPascalsNextStatementMoves) {
   Process->Resume();
   ASSERT_NO_FATAL_FAILURE(WaitFor("Exited("));
   EXPECT_TRUE(Listener->HasCall("Exited(0,"));
+}
+
+} // namespace
+} // namespace midebug
+
+namespace midebug {
+namespace {
+
+TEST_F(SourceLinesTest, AWindowsTargetsTablesComeInChunksAndByBareName) {
+  test::TFakeOnPath Fake("lldb-mi", "sourcelines-windows.script");
+  Process = TGDBProcessManager::CreateProcess(Listener, "/work/prog.exe", "", "", "local", "Win64", glPascal,
+                                              gcAMD64, "lldb-mi");
+  TIntegerArray Lines;
+  Process->GetSourceLines("C:/src/big.pas", Lines);
+  ASSERT_EQ(Lines.size(), 2048u) << "three chunks, the last one empty";
+  EXPECT_EQ(Lines.front(), 1);
+  EXPECT_EQ(Lines.back(), 2048);
+
+  const Integer File = Process->GetThread(1)->GetFileIndex("C:/src/small.pas");
+  EXPECT_EQ(Process->GetFileName(File), "C:\\src\\small.pas");
+  EXPECT_EQ(Process->FindSourceAddress(File, 7), (TAddressArray{0x401010, 0x401030}));
+  EXPECT_EQ(Process->FindSourceAddress(File, 8), (TAddressArray{0x401020}));
+
+  for (const UInt64 Address : {0x401012, 0x40101F}) {
+    UInt64 Start = 0;
+    Integer Size = 0, FileIndex = 0, Line = 0;
+    ASSERT_TRUE(Process->FindSourceLine(Address, Start, Size, FileIndex, Line)) << "one request for both";
+    EXPECT_EQ(Start, 0x401010u);
+    EXPECT_EQ(Size, 0x10);
+    EXPECT_EQ(Line, 7);
+    EXPECT_EQ(FileIndex, File);
+  }
+}
+
+using TIntegerSet = std::set<Integer>;
+
+TEST_F(SourceLinesTest, LLDBsFrontEndListsLinesAndMovesTheNextStatement) {
+  std::string WhyNot;
+  const std::string LLDB = test::LLDBMIPath(WhyNot);
+  if (LLDB.empty())
+    GTEST_SKIP() << WhyNot;
+  Process = TGDBProcessManager::CreateProcess(Listener, test::Debuggee("sourcelines"), "", Logs.Path(), "local",
+                                              "Linux64", glC, gcAMD64, LLDB);
+  TIntegerArray Lines;
+  Process->GetSourceLines("sourcelines.c", Lines);
+  // LLDB lists a line once for each of its statements.
+  EXPECT_EQ(TIntegerSet(Lines.begin(), Lines.end()), (TIntegerSet{4, 5, 6, 7, 8, 9, 10, 11, 12, 13, 14, 15}));
+  // LLDB's front end answers a line's addresses as they are in the file.
+  TGDBLocation Nine, Ten;
+  ASSERT_TRUE(Process->FindSourceLocation("sourcelines.c", 9, Nine));
+  ASSERT_TRUE(Process->FindSourceLocation("sourcelines.c", 10, Ten));
+  ASSERT_GT(Ten.Address, Nine.Address);
+
+  ASSERT_TRUE(Core().ProcessAsyncRequest("-break-insert sourcelines.c:9"));
+  Process->Run();
+  ASSERT_NO_FATAL_FAILURE(WaitFor("Suspended("));
+  ASSERT_EQ(Stop().Line, 9);
+  ASSERT_TRUE(Process->SetNewEip(Stop().Address + (Ten.Address - Nine.Address)));
+  EXPECT_EQ(Stop().Line, 10);
+  Process->Resume();
+  ASSERT_NO_FATAL_FAILURE(WaitFor("Exited("));
+  EXPECT_TRUE(Listener->HasCall("Exited(104,"));
 }
 
 } // namespace
