@@ -18,7 +18,8 @@ namespace {
 /// Windows targets list a file's lines in chunks of this many.
 constexpr Integer WindowsLineChunk = 1024;
 
-/// What "info line" is asked about: an address, or a file's line.
+/// What "info line" is asked about: an address, a file's line, or (Line 0,
+/// GDB only) a function.
 struct TLineQuestion {
   std::optional<UInt64> Address;
   std::string File;
@@ -44,8 +45,10 @@ bool AskInfoLine(TGDBProcess& Process, TGDBLineCache& Lines, const TLineQuestion
     if (LLDB)
       return Question.Address ? Builder.CreateDataInfoLineCommand(Token, *Question.Address)
                               : Builder.CreateDataInfoLineCommand(Token, Question.File, Question.Line);
-    return Question.Address ? Builder.CreateCLInfoLineCommand(Token, *Question.Address)
-                            : Builder.CreateCLInfoLineCommand(Token, Question.File, Question.Line);
+    if (Question.Address)
+      return Builder.CreateCLInfoLineCommand(Token, *Question.Address);
+    return Question.Line > 0 ? Builder.CreateCLInfoLineCommand(Token, Question.File, Question.Line)
+                             : Builder.CreateCLInfoLineCommand(Token, Question.File);
   });
   if (LLDB) {
     Answer.FSource = Reply.FSource;
@@ -136,11 +139,15 @@ bool TGDBProcess::FindSourceLine(UInt64 Address, UInt64& StartAddr, Integer& Siz
 
 bool TGDBProcess::FindSourceLocation(const std::string& FileName, Integer Line, TGDBLocation& Location) {
   Location = DummyLocation;
-  TCLInfoLineResult Answer;
-  if (FileName.empty() || Line < 1 ||
-      !AskInfoLine(*this, *FLines, {std::nullopt, TGDBFileTable::DebuggerName(FileName, IsWindows()), Line}, Answer))
+  const bool Function = Line == 0 && !IsLLDB();
+  const std::string Asked = Function ? FileName : TGDBFileTable::DebuggerName(FileName, IsWindows());
+  if (Asked.empty() || (Line < 1 && !Function))
     return false;
-  Location = {Line, FileName, Answer.FStartAddr};
+  TCLInfoLineResult Answer;
+  if (!AskInfoLine(*this, *FLines, {std::nullopt, Asked, Line}, Answer))
+    return false;
+  Location = Function ? TGDBLocation{Answer.FLine, Answer.FSource, Answer.FStartAddr}
+                      : TGDBLocation{Line, FileName, Answer.FStartAddr};
   return true;
 }
 

@@ -698,6 +698,10 @@ std::string TGDBCommand::CreateCLInfoLineCommand(std::string& Token, UInt64 Addr
   return EchoedCLLine(Token, ctCLInfoLine, " *" + Hex(Address));
 }
 
+std::string TGDBCommand::CreateCLInfoLineCommand(std::string& Token, const std::string& Function) {
+  return EchoedCLLine(Token, ctCLInfoLine, " " + Function);
+}
+
 std::string TGDBCommand::CreateCLSetVariableCommand(std::string& Token, const std::string& Name,
                                                     const std::string& Value) {
   return EchoedCLLine(Token, ctCLSetVariable, " " + Name + " = " + Value);

@@ -93,6 +93,11 @@ const std::vector<TCliSession::TCommandEntry>& TCliSession::Commands() {
       {"kill", &TCliSession::CmdKill, "kill", "end the program"},
       {"detach", &TCliSession::CmdDetach, "detach", "let the program go on without the debugger"},
       {"quit", &TCliSession::CmdQuit, "quit", "end the session (a launched program is killed, an attached one detached)"},
+      {"list", &TCliSession::CmdList, "list [FILE:]LINE | FUNCTION",
+       "ten source lines around LINE or FUNCTION, the current line marked"},
+      {"info", &TCliSession::CmdInfo, "info line FILE:LINE | *ADDRESS", "the code addresses of a source line"},
+      {"jump", &TCliSession::CmdJump, "jump LINE",
+       "make LINE of the current function the next statement ('continue' runs on from there)"},
       {"help", &TCliSession::CmdHelp, "help", "this list"},
   };
   return Table;

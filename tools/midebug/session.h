@@ -100,6 +100,18 @@ private:
   void CmdQuit(const std::string& Name, const std::vector<std::string>& Arguments);
   void CmdHelp(const std::string& Name, const std::vector<std::string>& Arguments);
 
+  // --- Source lines (sourcecommands.cpp) ---------------------------------
+  void CmdList(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdInfo(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdJump(const std::string& Name, const std::vector<std::string>& Arguments);
+  /// Where the program stands in the current thread and frame, or the empty
+  /// location.
+  TGDBLocation CurrentLocation();
+  /// The readable path of a file the debugger knows by Name, which holds
+  /// Line; empty when none is found.
+  std::string SourcePath(const std::string& Name, Integer Line);
+  // -------------------------------------------------------------------------
+
   /// True when the program can be resumed or stepped; otherwise prints why.
   bool RequireStopped(const std::string& Name);
   /// The thread commands act on, or null with the reason printed.
