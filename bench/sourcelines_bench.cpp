@@ -46,7 +46,7 @@ std::string AddressText(UInt64 Address) {
 struct TBoth {
   TIntfPtr<bench::TQuietListener> Listener{new bench::TQuietListener};
   TIntfPtr<IGDBProcess> Process;
-  bench::TRawGdb Raw;
+  bench::TRawGdbPipes Raw;
   std::string Source;
 
   /// Empty on success, else why not.
@@ -63,7 +63,7 @@ struct TBoth {
     }
     Process->SetRunToMainBreakpoint();
     Process->Run();
-    if (!bench::AwaitStops(*Listener, 1) || !Raw.Start(Program) ||
+    if (!bench::AwaitStops(*Listener, 1) || !Raw.Start() || !Raw.StartProgram(Program, "main") ||
         !Raw.Request("-gdb-set filename-display absolute"))
       return "cannot reach main";
     return {};

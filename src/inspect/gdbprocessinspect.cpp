@@ -11,12 +11,5 @@ void TGDBProcess::CreateWatchBreakpoint(UInt64, bool, bool, const TIntfPtr<IGDBB
 void TGDBProcess::DeleteBreakpoint(Integer) {}
 void TGDBProcess::EnableBreakpoint(Integer) {}
 void TGDBProcess::DisableBreakpoint(Integer) {}
-Integer TGDBProcess::GetMemory(UInt64, void*, Integer) { return 0; }
-Integer TGDBProcess::SetMemory(UInt64, const void*, Integer) { return 0; }
-TIntfPtr<IGDBDisassemble> TGDBProcess::GetDisassembler() { return nullptr; }
-void TGDBProcess::DisassembleAt(UInt64, Integer& Size, std::string& Text) {
-  Size = 0;
-  Text.clear();
-}
 
 } // namespace midebug

@@ -5,6 +5,7 @@
 #include "inspect/gdbfiletable.h"
 #include "inspect/gdblinecache.h"
 #include "inspect/gdbthreadtable.h"
+#include "mi/gdbregisters.h"
 #include "process/gdbprocess.h"
 
 #include <algorithm>
@@ -79,22 +80,6 @@ std::string AddressText(UInt64 Address) {
   char Text[24];
   std::snprintf(Text, sizeof Text, "0x%llX", static_cast<unsigned long long>(Address));
   return Text;
-}
-
-/// Writes Value to the register the debugger names Name, in the current
-/// thread's innermost frame, through GDB's MI register write.
-bool WriteGDBRegister(TGDBProcess& Process, std::string_view Name, UInt64 Value) {
-  TDataListRegisterNamesResult Names(Process.CPU(), "");
-  if (!Process.Requests().Ask(Names, &TGDBCommand::CreateDataListRegisterNames, std::vector<Integer>()))
-    return false;
-  const auto Found = std::find(Names.FNames.begin(), Names.FNames.end(), Name);
-  if (Found == Names.FNames.end())
-    return false;
-  const std::string Number = std::to_string(Found - Names.FNames.begin());
-  TGDBResult Written(ctDataWriteRegisterValues);
-  return Process.Requests().Ask(Written, [&](TGDBCommand& Builder, std::string& Token) {
-    return Builder.CreateMiCommand(ctDataWriteRegisterValues, Token) + " x " + Number + " " + AddressText(Value);
-  });
 }
 
 } // namespace
@@ -253,21 +238,19 @@ bool TGDBProcess::SetNewEip(UInt64 Address) {
       return false;
     }
   }
-  const std::string_view PC = PCRegisterName(CPU());
-  if (IsLLDB()) {
-    FRequests.Fire(static_cast<std::string (TGDBCommand::*)(std::string&, const std::string&, UInt64)>(
-                       &TGDBCommand::CreateDataWriteRegisterValues),
-                   std::string(PC), Address);
-  } else if (!WriteGDBRegister(*this, PC, Address)) {
+  const TRegisterTable Table = GeneralRegisterTable(CPU(), FRequests.Platform());
+  const auto PC = std::find(Table.Registers.begin(), Table.Registers.end(), PCRegisterName(CPU()));
+  const TIntfPtr<IGDBThread> Thread = FThreads->Get(ThreadId);
+  TUInt64Array Old;
+  UInt64 Unused = 0;
+  const size_t Index = static_cast<size_t>(PC - Table.Registers.begin());
+  if (PC == Table.Registers.end() || !Thread->GetRegisters(Old, Unused) || Old.size() <= Index)
     return false;
-  }
-  FLines->ForgetInfoLine();
-  FThreads->ResetCallStacks();
-  // GDB keeps the frames it unwound before the write and would step from
-  // the old line (GDB 13 then stops on an internal error): selecting the
-  // thread again makes it unwind afresh, and gives the new location.
-  FThreads->Select(ThreadId);
-  return true;
+  TUInt64Array New = Old;
+  New[Index] = Address;
+  // The thread's register write selects the thread again afterwards, which
+  // fetches the new location (and makes GDB forget the frames it unwound).
+  return Thread->SetRegisters(Old, New);
 }
 
 } // namespace midebug

@@ -1,5 +1,6 @@
 #include "inspect/gdbthread.h"
 
+#include "inspect/gdbregisterids.h"
 #include "inspect/gdbthreadtable.h"
 #include "process/gdbprocess.h"
 
@@ -156,24 +157,71 @@ TStringArray TGDBThread::GetCallParams(Integer Index) {
 
 Integer TGDBThread::GetFileIndex(const std::string& FileName) { return FProcess->AddFileName(FileName); }
 
-// Registers, evaluation, inspectors and disassembly come with operations of
-// their own; until then they report failure.
+// --- Registers -----------------------------------------------------------------
+
+bool TGDBThread::AtFrameZero(const std::function<bool()>& Read) {
+  SetAsSuspendedThread();
+  if (!ActsOnThisThread())
+    return false;
+  // Registers are read in the innermost frame; the frame the IDE selected is
+  // selected again afterwards.
+  const Integer Frame = FFrameIndex;
+  if (Frame != 0)
+    FProcess->Threads().SelectFrame(0);
+  const bool Done = Read();
+  if (Frame != 0)
+    FProcess->Threads().SelectFrame(Frame);
+  return Done;
+}
+
+bool TGDBThread::Writable() {
+  SetAsSuspendedThread();
+  return !ZombieState() && FProcess->GetSuspendedThreadId() == FId;
+}
+
+void TGDBThread::Relocate() {
+  // The debugger reports no new location for a written pc or stack pointer,
+  // and GDB 13 even answers with its frames from before the write until a
+  // thread is selected: selecting this one again fetches the new location.
+  FCallCount = -1;
+  FCallWindows.clear();
+  const Integer Frame = FFrameIndex;
+  FProcess->Threads().Select(FId);
+  if (Frame != 0)
+    FProcess->Threads().SelectFrame(Frame);
+}
+
 bool TGDBThread::GetRegisters(TUInt64Array& Values, UInt64& PC) {
-  Values.clear();
+  const bool Read = AtFrameZero([&] { return FProcess->Registers().GetRegisters(Values); });
   PC = FLocation.Address;
-  return false;
+  return Read;
 }
-bool TGDBThread::SetRegisters(const TUInt64Array&, const TUInt64Array&) { return false; }
+
+bool TGDBThread::SetRegisters(const TUInt64Array& Old, const TUInt64Array& New) {
+  if (!Writable())
+    return false;
+  const bool Written = FProcess->Registers().SetRegisters(Old, New);
+  if (Old != New)
+    Relocate();
+  return Written;
+}
+
 bool TGDBThread::GetFPURegisters(TFPURegValueArray& Values) {
-  Values.clear();
-  return false;
+  return AtFrameZero([&] { return FProcess->Registers().GetFPURegisters(Values); });
 }
-bool TGDBThread::SetFPURegisters(const TFPURegValueArray&, const TFPURegValueArray&) { return false; }
+
+bool TGDBThread::SetFPURegisters(const TFPURegValueArray& Old, const TFPURegValueArray& New) {
+  return Writable() && FProcess->Registers().SetFPURegisters(Old, New);
+}
+
 bool TGDBThread::GetXMMRegisters(TXMMRegValueArray& Values) {
-  Values.clear();
-  return false;
+  return AtFrameZero([&] { return FProcess->Registers().GetXMMRegisters(Values); });
 }
-bool TGDBThread::SetXMMRegisters(const TXMMRegValueArray&, const TXMMRegValueArray&) { return false; }
+
+bool TGDBThread::SetXMMRegisters(const TXMMRegValueArray& Old, const TXMMRegValueArray& New) {
+  return Writable() && FProcess->Registers().SetXMMRegisters(Old, New);
+}
+
 bool TGDBThread::SetRunToMainBreakpoint(bool& NoEntryStop) {
   if (!FProcess->Kernel().SupportStopOnEntryPoint()) {
     NoEntryStop = true;
@@ -195,6 +243,8 @@ void TGDBThread::StepOut() { Step(&TGDBCommand::CreateExecFinishCommand); }
 void TGDBThread::InstStepInto() { Step(&TGDBCommand::CreateExecStepInstructionCommand); }
 void TGDBThread::InstStepOver() { Step(&TGDBCommand::CreateExecNextInstructionCommand); }
 
+// Evaluation and inspectors come with operations of their own; until then
+// they report failure.
 TGDBRetCode TGDBThread::Evaluate(const std::string&, const std::string&, Integer, std::string& Value, bool& CanModify,
                                  std::string& TypeName) {
   Value.clear();
@@ -206,7 +256,7 @@ TGDBRetCode TGDBThread::Modify(const std::string&, std::string& Value) {
   Value.clear();
   return ercError;
 }
-TIntfPtr<IGDBDisassemble> TGDBThread::GetDisassembler() { return nullptr; }
+TIntfPtr<IGDBDisassemble> TGDBThread::GetDisassembler() { return FProcess->GetDisassembler(); }
 TIntfPtr<IGDBInspect> TGDBThread::CreateLocalVarsInspector(Integer) { return nullptr; }
 TIntfPtr<IGDBInspect> TGDBThread::CreateInspector(const std::string&, Integer) { return nullptr; }
 

@@ -4,6 +4,7 @@
 #include "platform/hexdigits.h"
 
 #include <array>
+#include <utility>
 
 namespace midebug {
 
@@ -66,7 +67,8 @@ std::string DecodeLLDBProgramOutput(std::string_view Text) {
   return ReplaceAll(std::move(Bytes), "\r\n", "\n");
 }
 
-/// Console text with the escapes \n as one blank and \t as three blanks. An
+/// Console text with the escape \n as a line break (GDB writes its console
+/// lines in pieces; a reader joins them at the breaks) and \t as three blanks. An
 /// escaped backslash is kept as written and does not start an escape, so a
 /// path such as "C:\\new" is not broken.
 std::string FlattenConsoleEscapes(std::string_view Text) {
@@ -79,7 +81,7 @@ std::string FlattenConsoleEscapes(std::string_view Text) {
     }
     const char Escaped = Text[++I];
     if (Escaped == 'n')
-      Flat += ' ';
+      Flat += '\n';
     else if (Escaped == 't')
       Flat += "   ";
     else {
@@ -88,6 +90,12 @@ std::string FlattenConsoleEscapes(std::string_view Text) {
     }
   }
   return Flat;
+}
+
+/// The text from From to the first line break, without blanks around it.
+std::string_view FirstLineTrimmed(std::string_view Text, size_t From) {
+  const std::string_view Rest = Text.substr(From);
+  return TrimBlanks(Rest.substr(0, Rest.find('\n')));
 }
 
 /// Drops one trailing \n and then one trailing \r escape of a target-stream
@@ -198,11 +206,16 @@ bool TGDBOutputParser::ProcessResultRecord() {
   // may later add ^error) finds nobody waiting.
   TGDBResult* WaitObject = FToken.empty() ? nullptr : FProcess.RemoveWaitObject(FToken);
 
+  const std::string CLIError = std::exchange(FCLIError, std::string());
   if (Class == "done") {
     if (FScanner.Char() == ',' && !FScanner.AtEnd()) {
       FScanner.NextChar();
       if (WaitObject)
         WaitObject->FError = !DecodeResult(*WaitObject, FScanner, FIsLLDB);
+    } else if (WaitObject && !CLIError.empty() &&
+               (WaitObject->FCommand == ctCLRegisterWrite || WaitObject->FCommand == ctCLMemoryWrite)) {
+      WaitObject->FError = true;
+      WaitObject->SetErrorMessage(CLIError);
     }
   } else if (Class == "running") {
     FProcess.NotifyProcessResumed();
@@ -473,9 +486,9 @@ bool TGDBOutputParser::ProcessNotifyRecord() {
     }
   } else if (Class == "shlib-state-modified" || Class == "dyld-load-address-was-resolved" ||
              Class == "breakpoint-created" || Class == "thread-group-added" || Class == "thread-group-exited" ||
-             Class == "cmd-param-changed") {
+             Class == "cmd-param-changed" || Class == "memory-changed") {
     // Nothing the process tracks; a changed setting is the echo of one the
-    // process made itself ("set args").
+    // process made itself ("set args"), changed memory the echo of a write.
   } else {
     const std::string Rest(FScanner.ReadRestOfLine(FEndOfLineMarker));
     if (Rest == "\n" || (FIsLLDB && Rest.starts_with("==")))
@@ -573,13 +586,13 @@ bool TGDBOutputParser::ProcessConsoleStream() {
   }
   const std::string Text = FlattenConsoleEscapes(Raw);
   if (FIsLLDB && Text.starts_with(LLDBMaxChildrenSetting)) {
-    const std::string_view Count = TrimBlanks(std::string_view(Text).substr(LLDBMaxChildrenSetting.size()));
+    const std::string_view Count = FirstLineTrimmed(Text, LLDBMaxChildrenSetting.size());
     FProcess.NotifySettingMaxChildrenCountChanged(MIStrToIntDef(Count, -1));
     return false;
   }
   Log(etConsole, Text);
   if (Text.starts_with(LanguageAnnouncement))
-    FProcess.NotifyLanguageChanged(std::string(TrimBlanks(std::string_view(Text).substr(LanguageAnnouncement.size()))));
+    FProcess.NotifyLanguageChanged(std::string(FirstLineTrimmed(Text, LanguageAnnouncement.size())));
   return false;
 }
 
@@ -608,6 +621,8 @@ bool TGDBOutputParser::ProcessLogStream() {
   if (!WaitObject) {
     if (FProcess.IsWindows() && FProcess.IsAttachMode() && Text.find(AttachFailed) != std::string::npos)
       FProcess.NotifyProcessExited(-1, "");
+    if (FIsLLDB && Text.starts_with("error: "))
+      FCLIError = std::string(StripTrailingEscapes(Text));
     return false;
   }
   if (WaitObject->FCommand == ctCLKill) {

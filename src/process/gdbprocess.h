@@ -136,8 +136,8 @@ public:
   TGDBModule GetModule(Integer Id) override { return FModules.Current(Id); }
 
   bool CanSetRunToMainBreakpoint() const { return FBreakOnMain != nullptr; } ///< run-to-main breakpoint placed
-
   TGDBThreadTable& Threads() { return *FThreads; }
+  TGDBRegisterIds& Registers() { return *FRegisters; }
   TGDBKernel& Kernel() { return *FKernel; }
   TGDBCPU CPU() const { return FRequests.CPU(); }
   const TWaitPolicy& WaitPolicy() const { return FRequests.Policy(); }
@@ -206,7 +206,7 @@ private:
   TProgramTerminal FTerminal;
 
   TLiveProcessKey FLiveKey;
-  std::thread FOutputThread;
+  std::thread FOutputThread; ///< the only reader of the debugger
   std::string FLaunchErrorMessage;
   std::atomic<Integer> FMaxChildrenCount{-1}, FPid{-1}, FLastSuspendedThreadId{-1};
   std::atomic<UInt64> FBaseAddress{0};

@@ -141,12 +141,12 @@ void TCliSession::CmdInfo(const std::string& Name, const std::vector<std::string
   UInt64 Start = 0;
   Integer Size = 0, FileIndex = 0;
   if (!FProcess->FindSourceLine(Address, Start, Size, FileIndex, Line)) {
-    FOutput.Error(Name, "no line number information for address " + LocationJson({0, "", Address})["address"].get<std::string>());
+    FOutput.Error(Name, "no line number information for address " + HexAddress(Address));
     return;
   }
   const std::string Source = FProcess->GetFileName(FileIndex);
-  const std::string StartText = LocationJson({0, "", Start})["address"];
-  const std::string EndText = LocationJson({0, "", Start + static_cast<UInt64>(Size)})["address"];
+  const std::string StartText = HexAddress(Start);
+  const std::string EndText = HexAddress(Start + static_cast<UInt64>(Size));
   FOutput.Emit({{"answer", Name}, {"file", Source}, {"line", Line}, {"start", StartText}, {"end", EndText}},
                "Line " + std::to_string(Line) + " of \"" + Source + "\" starts at address " + StartText +
                    " and ends at " + EndText + ".");
