@@ -124,7 +124,7 @@ TEST_F(CliBreakpoints, WrongArgumentsGetAClearErrorAndTheSessionGoesOn) {
       {"break", "not a line: x"},
       {"delete", "no breakpoint 7"},
       {"ignore", "no breakpoint 9"},
-      {"info", "usage: info breakpoints"},
+      {"info", "usage: info breakpoints | line LOCATION | registers [WHICH]"},
       {"catch", "usage: catch throw|catch|raise"},
   };
   std::vector<json> Errors;

@@ -306,3 +306,52 @@ TEST_F(CliTest, CliBacktraceOfADeepStackReadsLikeGdbsAndReachesEveryFrame) {
 
 } // namespace
 } // namespace midebug
+
+// --- Source lines -------------------------------------------------------------
+
+namespace midebug {
+namespace {
+
+// tests/debuggees/sourcelines.c: main runs from line 4 to 12, below is at
+// lines 13 to 15.
+TEST_F(CliTest, CliListsSourceShowsALinesCodeAndMovesTheNextStatement) {
+  const std::string Program = Quote(Debuggee("sourcelines"));
+  const TCliRun Run = RunCli(Program, "list below\nstart\ninfo line sourcelines.c:9\nlist\njump 14\njump 10\n"
+                                      "next\ninfo line *0x1\nlist nosuch\njump x\n");
+  const auto Answers = [&](const std::string& Name) {
+    std::vector<json> Found;
+    for (const json& Line : Run.Lines)
+      if (Line.value("answer", "") == Name)
+        Found.push_back(Line);
+    return Found;
+  };
+  const std::vector<json> Lists = Answers("list");
+  ASSERT_EQ(Lists.size(), 3u) << Run.Stdout;
+  EXPECT_EQ(Lists[0]["lines"].front()["line"], 8) << "five lines before below's first line";
+  EXPECT_EQ(Lists[0]["lines"].back()["line"], 15) << "to the end of the file";
+  const json& AtStart = Lists[1]["lines"];
+  ASSERT_EQ(AtStart.size(), 10u);
+  for (const json& Line : AtStart)
+    EXPECT_EQ(Line["current"], Line["line"] == 5) << Line;
+  EXPECT_EQ(AtStart[4]["text"], "  int total = 0;");
+  EXPECT_EQ(Lists[2]["error"], "no function or line 'nosuch'");
+
+  const std::vector<json> Infos = Answers("info");
+  ASSERT_EQ(Infos.size(), 2u) << Run.Stdout;
+  EXPECT_EQ(Infos[0]["line"], 9);
+  EXPECT_EQ(FileName(Infos[0]), "sourcelines.c");
+  EXPECT_LT(std::stoull(Infos[0]["start"].get<std::string>(), nullptr, 16),
+            std::stoull(Infos[0]["end"].get<std::string>(), nullptr, 16));
+  EXPECT_TRUE(Infos[1].contains("error")) << Infos[1];
+
+  const std::vector<json> Jumps = Answers("jump");
+  ASSERT_EQ(Jumps.size(), 3u) << Run.Stdout;
+  EXPECT_EQ(Jumps[0]["error"], "cannot move to line 14: it is not in the current function");
+  EXPECT_EQ(Jumps[1]["line"], 10);
+  EXPECT_EQ(Jumps[2]["error"], "usage: jump LINE");
+  const json* Next = Run.Find([](const json& Line) { return Line.value("event", "") == "stopped" && Line["line"] == 11; });
+  EXPECT_NE(Next, nullptr) << "the program went on from line 10: " << Run.Stdout;
+}
+
+} // namespace
+} // namespace midebug

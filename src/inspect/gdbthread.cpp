@@ -155,7 +155,7 @@ TStringArray TGDBThread::GetCallParams(Integer Index) {
   return Frame ? Frame->Params : TStringArray();
 }
 
-Integer TGDBThread::GetFileIndex(const std::string& FileName) { return FProcess->GetFileIndex(FileName); }
+Integer TGDBThread::GetFileIndex(const std::string& FileName) { return FProcess->AddFileName(FileName); }
 
 // --- Registers -----------------------------------------------------------------
 

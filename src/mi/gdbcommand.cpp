@@ -719,6 +719,18 @@ std::string TGDBCommand::CreateCLInfoLineAddressCommand(std::string& Token, cons
   return EchoedCLLine(Token, ctCLInfoLineAddress, " " + File + ":" + std::to_string(Line));
 }
 
+std::string TGDBCommand::CreateCLInfoLineCommand(std::string& Token, const std::string& File, Integer Line) {
+  return EchoedCLLine(Token, ctCLInfoLine, " " + File + ":" + std::to_string(Line));
+}
+
+std::string TGDBCommand::CreateCLInfoLineCommand(std::string& Token, UInt64 Address) {
+  return EchoedCLLine(Token, ctCLInfoLine, " *" + Hex(Address));
+}
+
+std::string TGDBCommand::CreateCLInfoLineCommand(std::string& Token, const std::string& Function) {
+  return EchoedCLLine(Token, ctCLInfoLine, " " + Function);
+}
+
 std::string TGDBCommand::CreateCLSetVariableCommand(std::string& Token, const std::string& Name,
                                                     const std::string& Value) {
   return EchoedCLLine(Token, ctCLSetVariable, " " + Name + " = " + Value);

@@ -303,6 +303,11 @@ public:
 
   // CLI commands answered through GDB's echo of the line
   std::string CreateCLInfoLineAddressCommand(std::string& Token, const std::string& File, Integer Line);
+  /// GDB's "info line" for a line ("FILE:LINE") or an address ("*0x...").
+  std::string CreateCLInfoLineCommand(std::string& Token, const std::string& File, Integer Line);
+  std::string CreateCLInfoLineCommand(std::string& Token, UInt64 Address);
+  /// "info line" for a function's name.
+  std::string CreateCLInfoLineCommand(std::string& Token, const std::string& Function);
   std::string CreateCLSetVariableCommand(std::string& Token, const std::string& Name, const std::string& Value);
   std::string CreateCLSetVariableCommand(std::string& Token, const std::string& Name, UInt64 Value);
   /// LLDB sets the variable in the target's environment ("NAME=VALUE").

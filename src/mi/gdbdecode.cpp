@@ -8,6 +8,7 @@
 #include "mi/gdbdecodeinternal.h"
 #include "mi/gdboutput.h"
 
+#include <algorithm>
 #include <map>
 
 namespace midebug {
@@ -481,6 +482,68 @@ bool DecodeCLInfoLineAddress(TCLInfoLineAddressResult& InfoLine, TMIScanner& Sca
   return true;
 }
 
+/// The hexadecimal address at the head of Text and, when "<symbol+offset>"
+/// follows it, the symbol; Text moves past both.
+UInt64 ReadConsoleAddress(std::string_view& Text, std::string* Function) {
+  const size_t End = std::min(Text.find(' '), Text.size());
+  const UInt64 Address = MIStrToUInt64Def(Text.substr(0, End), 0);
+  Text.remove_prefix(End);
+  const size_t Open = Text.find_first_not_of(' ');
+  if (Open == std::string_view::npos || Text[Open] != '<')
+    return Address;
+  const size_t Close = Text.find('>', Open);
+  if (Close == std::string_view::npos)
+    return Address;
+  if (Function != nullptr) {
+    std::string_view Symbol = Text.substr(Open + 1, Close - Open - 1);
+    const size_t Plus = Symbol.rfind('+');
+    if (Plus != std::string_view::npos && Symbol.find_first_not_of("0123456789", Plus + 1) == std::string_view::npos)
+      Symbol = Symbol.substr(0, Plus);
+    *Function = std::string(Symbol);
+  }
+  Text.remove_prefix(Close + 1);
+  return Address;
+}
+
+// GDB 13 answers "info line" on the console, in one of these forms:
+//   Line 7 of "t.c" starts at address 0x114c <main+15> and ends at 0x1159 <main+28>.
+//   Line 3 of "t.c" is at address 0x1138 <twice+15> but contains no code.
+//   No line number information available for address 0x10
+//   Line number 30 is out of range for "t.c".
+// Only the first is a code range; the others keep GDB's words.
+bool DecodeCLInfoLine(TCLInfoLineResult& InfoLine, TMIScanner& Scanner) {
+  const std::string Answer(Scanner.ReadCString());
+  std::string_view Text = Answer;
+  while (!Text.empty() && (Text.back() == '\n' || Text.back() == '.'))
+    Text.remove_suffix(1);
+  InfoLine.FMessage = std::string(Text);
+  constexpr std::string_view LinePrefix = "Line ";
+  constexpr std::string_view Of = " of \"";
+  constexpr std::string_view Starts = "\" starts at address ";
+  constexpr std::string_view NoCode = "\" is at address ";
+  const size_t OfAt = Text.find(Of);
+  if (!Text.starts_with(LinePrefix) || OfAt == std::string_view::npos)
+    return false;
+  InfoLine.FLine = static_cast<Integer>(MIStrToUInt64Def(Text.substr(LinePrefix.size(), OfAt - LinePrefix.size()), 0));
+  // The file name is printed unescaped: the last of the two phrases that
+  // may follow it ends it.
+  size_t NameEnd = Text.rfind(Starts);
+  const bool HasCode = NameEnd != std::string_view::npos;
+  if (!HasCode)
+    NameEnd = Text.rfind(NoCode);
+  if (NameEnd == std::string_view::npos || NameEnd < OfAt + Of.size())
+    return false;
+  InfoLine.FSource = std::string(Text.substr(OfAt + Of.size(), NameEnd - OfAt - Of.size()));
+  Text.remove_prefix(NameEnd + (HasCode ? Starts : NoCode).size());
+  InfoLine.FStartAddr = ReadConsoleAddress(Text, &InfoLine.FFunction);
+  constexpr std::string_view Ends = " and ends at ";
+  if (!HasCode || !Text.starts_with(Ends))
+    return false;
+  Text.remove_prefix(Ends.size());
+  InfoLine.FEndAddr = ReadConsoleAddress(Text, nullptr);
+  return InfoLine.FEndAddr > InfoLine.FStartAddr;
+}
+
 } // namespace
 
 bool DecodeResult(TGDBResult& Result, TMIScanner& Scanner, bool IsLLDB) {
@@ -562,6 +625,8 @@ bool DecodeConsoleResult(TGDBResult& Result, TMIScanner& Scanner) {
   switch (Result.FCommand) {
   case ctCLInfoLineAddress:
     return DecodeAs(Result, Scanner, DecodeCLInfoLineAddress);
+  case ctCLInfoLine:
+    return DecodeAs(Result, Scanner, DecodeCLInfoLine);
   case ctCLKill:
   case ctCLMemoryWrite:
     return true;

@@ -304,6 +304,8 @@ public:
 class TDataInfoLineResult : public TGDBResult {
 public:
   TDataInfoLineResult();
+  /// A result read from another command's answer.
+  explicit TDataInfoLineResult(TMiCommand Command) : TGDBResult(Command) {}
   /// Bytes of code of the line: FEndAddr - FStartAddr, or 0 when the reply
   /// gave no end beyond the start.
   UInt64 GetSize() const;
@@ -311,6 +313,17 @@ public:
   Integer FLine = 0;
   UInt64 FStartAddr = 0;
   UInt64 FEndAddr = 0;
+};
+
+/// GDB's console answer to "info line": the line's file as GDB names it,
+/// the line, its code range and the function the range starts in. A line
+/// without code, an address without line information and a refusal leave
+/// FEndAddr 0 and FMessage GDB's words.
+class TCLInfoLineResult : public TDataInfoLineResult {
+public:
+  TCLInfoLineResult() : TDataInfoLineResult(ctCLInfoLine) {}
+  std::string FFunction;
+  std::string FMessage;
 };
 
 class TVarCreateResult : public TGDBResult {

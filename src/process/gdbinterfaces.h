@@ -198,6 +198,7 @@ public:
   virtual bool FindSourceLine(UInt64 Address, UInt64& StartAddr, Integer& Size, Integer& FileIndex,
                               Integer& Line) = 0;
   virtual TAddressArray FindSourceAddress(Integer FileIndex, Integer Line) = 0;
+  /// With Line 0, FileName names a function, found (by GDB) at its first line.
   virtual bool FindSourceLocation(const std::string& FileName, Integer Line, TGDBLocation& Location) = 0;
   virtual bool SetNewEip(UInt64 Address) = 0;
   virtual Integer GetFileIndex(const std::string& FileName) = 0;

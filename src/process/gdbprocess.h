@@ -51,14 +51,13 @@ public:
   Int64 GetKernelCapabilities() { return FKernel->GetCapabilities(); }
   void SetKernelCapabilites(Int64 Value) { FKernel->SetCapabilites(Value); }
 
-  /// Writes one command line without waiting; true when it was written.
-  bool ProcessAsyncRequest(const std::string& Request) { return FRequests.Send(Request); }
+  // --- Requests ----------------------------------------------------------
+  bool ProcessAsyncRequest(const std::string& Request) { return FRequests.Send(Request); } ///< written, unawaited
   /// Writes the line, awaits the reply in Result; true when written (then see FError, FTimeOut).
   bool ProcessSyncRequest(const std::string& Key, const std::string& Request, TGDBResult& Result) {
     return FRequests.SendAndWait(Key, Request, Result);
   }
-  /// Builds command lines; waits with the process's time-outs.
-  TGDBRequestEngine& Requests() { return FRequests; }
+  TGDBRequestEngine& Requests() { return FRequests; } ///< builds lines; waits with the time-outs
 
   // --- IGDBInternalProcess -----------------------------------------------
   void NotifyLogEvent(const TGDBLogEvent& Event) override;
@@ -109,6 +108,7 @@ public:
   bool FindSourceLocation(const std::string& FileName, Integer Line, TGDBLocation& Location) override;
   bool SetNewEip(UInt64 Address) override;
   Integer GetFileIndex(const std::string& FileName) override;
+  Integer AddFileName(const std::string& FileName); ///< GetFileIndex that adds a name it does not know
   std::string GetFileName(Integer FileIndex) override;
   bool SetFileName(Integer FileIndex, const std::string& FileName) override;
   Integer GetMemory(UInt64 Address, void* Buffer, Integer Size) override;

@@ -306,9 +306,8 @@ void TCliSession::CmdEnable(const std::string& Name, const std::vector<std::stri
   FOutput.Emit({{"answer", Name}, {Enable ? "enabled" : "disabled", Ids}}, "");
 }
 
-void TCliSession::CmdInfo(const std::string& Name, const std::vector<std::string>& Arguments) {
-  static const std::set<std::string> Subjects = {"breakpoints", "break", "b", "watchpoints"};
-  if (Arguments.size() != 1 || !Subjects.contains(Arguments[0])) {
+void TCliSession::CmdInfoBreakpoints(const std::string& Name, const std::vector<std::string>& Arguments) {
+  if (Arguments.size() != 1) {
     FOutput.Error(Name, "usage: info breakpoints");
     return;
   }

@@ -60,9 +60,7 @@ std::string HexAddress(uint64_t Address, bool Padded) {
   return Buffer;
 }
 
-std::string TSourceLines::Line(const std::string& File, long Line) {
-  if (File.empty() || Line <= 0)
-    return {};
+const std::vector<std::string>& TSourceLines::Lines(const std::string& File) {
   auto Found = FFiles.find(File);
   if (Found == FFiles.end()) {
     std::vector<std::string> Lines;
@@ -74,9 +72,20 @@ std::string TSourceLines::Line(const std::string& File, long Line) {
     }
     Found = FFiles.emplace(File, std::move(Lines)).first;
   }
-  if (static_cast<size_t>(Line) > Found->second.size())
+  return Found->second;
+}
+
+std::string TSourceLines::Line(const std::string& File, long Line) {
+  if (File.empty() || Line <= 0)
     return {};
-  return Found->second[static_cast<size_t>(Line) - 1];
+  const std::vector<std::string>& Text = Lines(File);
+  if (static_cast<size_t>(Line) > Text.size())
+    return {};
+  return Text[static_cast<size_t>(Line) - 1];
+}
+
+long TSourceLines::Count(const std::string& File) {
+  return File.empty() ? 0 : static_cast<long>(Lines(File).size());
 }
 
 } // namespace midebug::cli

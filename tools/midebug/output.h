@@ -54,8 +54,12 @@ class TSourceLines {
 public:
   /// The text of line Line (1-based) of File; empty when unreadable.
   std::string Line(const std::string& File, long Line);
+  /// The number of lines of File; 0 when unreadable.
+  long Count(const std::string& File);
 
 private:
+  const std::vector<std::string>& Lines(const std::string& File);
+
   std::map<std::string, std::vector<std::string>> FFiles;
 };
 

@@ -114,6 +114,8 @@ private:
   void CmdDetach(const std::string& Name, const std::vector<std::string>& Arguments);
   void CmdQuit(const std::string& Name, const std::vector<std::string>& Arguments);
   void CmdHelp(const std::string& Name, const std::vector<std::string>& Arguments);
+  /// "info SUBJECT ...": hands the words to the subject's command.
+  void CmdInfo(const std::string& Name, const std::vector<std::string>& Arguments);
 
   // --- Memory, disassembly and registers (memorycommands.cpp) -------------
   void CmdExamine(const std::string& Name, const std::vector<std::string>& Arguments);
@@ -122,6 +124,17 @@ private:
   void CmdInfoRegisters(const std::string& Name, const std::vector<std::string>& Arguments);
   void CmdSetRegister(const std::string& Name, const std::vector<std::string>& Arguments);
   // --- End of memory, disassembly and registers ----------------------------
+  // --- Source lines (sourcecommands.cpp) ---------------------------------
+  void CmdList(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdInfoLine(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdJump(const std::string& Name, const std::vector<std::string>& Arguments);
+  /// Where the program stands in the current thread and frame, or the empty
+  /// location.
+  TGDBLocation CurrentLocation();
+  /// The readable path of a file the debugger knows by Name, which holds
+  /// Line; empty when none is found.
+  std::string SourcePath(const std::string& Name, Integer Line);
+  // -------------------------------------------------------------------------
 
   /// Has the debugger load the program (again); raises when it cannot.
   void Load(TGDBLanguage Language, TGDBCPU CPU);
@@ -137,7 +150,7 @@ private:
   void CmdWatch(const std::string& Name, const std::vector<std::string>& Arguments);
   void CmdDelete(const std::string& Name, const std::vector<std::string>& Arguments);
   void CmdEnable(const std::string& Name, const std::vector<std::string>& Arguments);
-  void CmdInfo(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdInfoBreakpoints(const std::string& Name, const std::vector<std::string>& Arguments);
   void CmdIgnore(const std::string& Name, const std::vector<std::string>& Arguments);
   void CmdCatch(const std::string& Name, const std::vector<std::string>& Arguments);
   using TPlace = std::function<void(IGDBProcess& Process, const TIntfPtr<IGDBBreakpointListener>& Listener)>;
