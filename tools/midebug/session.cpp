@@ -196,7 +196,7 @@ bool TCliSession::Execute(const std::string& Line) {
     if (Blank != std::string_view::npos)
       Words.erase(Words.begin());
     if (Words.size() > Entry.MaxArguments) {
-      FOutput.Error(Entry.Name, Entry.MaxArguments == 0 ? "'" + Name + "' takes no arguments"
+      FOutput.Error(Entry.Name, Entry.MaxArguments == 0 ? "'" + std::string(Entry.Name) + "' takes no arguments"
                                                         : "usage: " + std::string(Entry.Usage));
       return true;
     }
