@@ -234,7 +234,10 @@ public:
   virtual UInt64 GetBaseAddress() = 0;
   virtual TGDBModule GetModule(Integer Id) = 0;
 
-  // Added after the slots above, which never move.
+  // Added after the operations above.
+  /// The start of the function that holds Address, as its disassembly
+  /// tells; 0 when unknown.
+  virtual UInt64 GetFunctionStart(UInt64 Address) = 0;
   /// A breakpoint on every function of that name, in the program and in the
   /// libraries it loads (later ones included); reported as a source one.
   virtual void CreateFunctionBreakpoint(const std::string& FunctionName,

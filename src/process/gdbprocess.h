@@ -132,10 +132,10 @@ public:
   Integer GetPid() override;
   UInt64 GetBaseAddress() override { return FBaseAddress; }
   TGDBModule GetModule(Integer Id) override { return FModules.Current(Id); }
+  UInt64 GetFunctionStart(UInt64 Address) override;
   void CreateFunctionBreakpoint(const std::string& Name, const TIntfPtr<IGDBBreakpointListener>& Listener) override;
   void CreateSizedWatchBreakpoint(UInt64 Address, Integer Size, bool ReadFlag, bool AccessFlag,
                                   const TIntfPtr<IGDBBreakpointListener>& Listener) override;
-
   bool CanSetRunToMainBreakpoint() const { return FBreakOnMain != nullptr; } ///< run-to-main breakpoint placed
   TGDBThreadTable& Threads() { return *FThreads; }
   TGDBRegisterIds& Registers() { return *FRegisters; }

@@ -306,12 +306,7 @@ void TCliSession::CmdEnable(const std::string& Name, const std::vector<std::stri
   FOutput.Emit({{"answer", Name}, {Enable ? "enabled" : "disabled", Ids}}, "");
 }
 
-void TCliSession::CmdInfo(const std::string& Name, const std::vector<std::string>& Arguments) {
-  static const std::set<std::string> Subjects = {"breakpoints", "break", "b", "watchpoints"};
-  if (Arguments.size() != 1 || !Subjects.contains(Arguments[0])) {
-    FOutput.Error(Name, "usage: info breakpoints");
-    return;
-  }
+void TCliSession::CmdInfo(const std::string& Name, const std::vector<std::string>& /*Arguments*/) {
   nlohmann::json List = nlohmann::json::array();
   std::string Text = FBreakpoints.empty() ? "No breakpoints.\n" : "Num  Type        Enb  Hits  Where\n";
   for (const auto& [Id, Breakpoint] : FBreakpoints) {
