@@ -138,7 +138,7 @@ TEST_F(Breakpoints, APendingBreakpointInALibraryLoadedLaterIsVerifiedWhenItLoads
 TEST_F(Breakpoints, WatchpointsStopWhereTheWatchedBytesAreWrittenOrRead) {
   LaunchToMain(Debuggee("breakpoints"), "1");
   const UInt64 Counter = AddressOf("&counter");
-  // The design's watch covers an int: the write to the upper half of the
+  // The unsized watch covers an int: the write to the upper half of the
   // long escapes it, not the sized one.
   auto LowHalf = Recorder(), Whole = Recorder(), Reads = Recorder();
   Process->CreateWatchBreakpoint(Counter, false, false, LowHalf);

@@ -66,7 +66,7 @@ TEST_F(CliBreakpoints, BreakpointsStopSayWhichCountHitsAndFollowIgnoreEnableDisa
   EXPECT_EQ(Stops[1]["breakpoint"], 1);
   EXPECT_EQ(Stops[1]["line"], Line("breakpoints.c", "bump-add"));
   EXPECT_EQ(Stops[2]["breakpoint"], 1);
-  const auto Lists = Run.All("answer", "info");
+  const auto Lists = Run.All("answer", "info breakpoints");
   // The temporary one is gone once it stopped; the missing file is pending.
   ASSERT_EQ(Lists.at(0)["breakpoints"].size(), 2u);
   EXPECT_EQ(Lists.at(0)["breakpoints"][1]["verified"], false);
@@ -124,7 +124,7 @@ TEST_F(CliBreakpoints, WrongArgumentsGetAClearErrorAndTheSessionGoesOn) {
       {"break", "not a line: x"},
       {"delete", "no breakpoint 7"},
       {"ignore", "no breakpoint 9"},
-      {"info", "usage: info breakpoints | line LOCATION | registers [WHICH]"},
+      {"info", "unknown command 'info'; 'help' lists the commands"},
       {"catch", "usage: catch throw|catch|raise"},
   };
   std::vector<json> Errors;
@@ -136,7 +136,7 @@ TEST_F(CliBreakpoints, WrongArgumentsGetAClearErrorAndTheSessionGoesOn) {
     EXPECT_EQ(Errors[Index]["answer"], Expected[Index].first);
     EXPECT_EQ(Errors[Index]["error"], Expected[Index].second);
   }
-  EXPECT_EQ(Run.All("answer", "info").back()["breakpoints"][0]["verified"], true);
+  EXPECT_EQ(Run.All("answer", "info breakpoints").back()["breakpoints"][0]["verified"], true);
   EXPECT_NE(Run.Status, 0);
 }
 

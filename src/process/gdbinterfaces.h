@@ -198,7 +198,6 @@ public:
   virtual bool FindSourceLine(UInt64 Address, UInt64& StartAddr, Integer& Size, Integer& FileIndex,
                               Integer& Line) = 0;
   virtual TAddressArray FindSourceAddress(Integer FileIndex, Integer Line) = 0;
-  /// With Line 0, FileName names a function, found (by GDB) at its first line.
   virtual bool FindSourceLocation(const std::string& FileName, Integer Line, TGDBLocation& Location) = 0;
   virtual bool SetNewEip(UInt64 Address) = 0;
   virtual Integer GetFileIndex(const std::string& FileName) = 0;
@@ -235,7 +234,10 @@ public:
   virtual UInt64 GetBaseAddress() = 0;
   virtual TGDBModule GetModule(Integer Id) = 0;
 
-  // Added after the slots above, which never move.
+  // Added after the operations above.
+  /// The start of the function that holds Address, as its disassembly
+  /// tells; 0 when unknown.
+  virtual UInt64 GetFunctionStart(UInt64 Address) = 0;
   /// A breakpoint on every function of that name, in the program and in the
   /// libraries it loads (later ones included); reported as a source one.
   virtual void CreateFunctionBreakpoint(const std::string& FunctionName,
@@ -244,9 +246,6 @@ public:
   /// Address; LLDB watches what CreateWatchBreakpoint does.
   virtual void CreateSizedWatchBreakpoint(UInt64 Address, Integer Size, bool ReadFlag, bool AccessFlag,
                                           const TIntfPtr<IGDBBreakpointListener>& Listener) = 0;
-  /// The start of the function that holds Address, as its disassembly
-  /// tells; 0 when unknown.
-  virtual UInt64 GetFunctionStart(UInt64 Address) = 0;
 };
 
 } // namespace midebug

@@ -306,11 +306,7 @@ void TCliSession::CmdEnable(const std::string& Name, const std::vector<std::stri
   FOutput.Emit({{"answer", Name}, {Enable ? "enabled" : "disabled", Ids}}, "");
 }
 
-void TCliSession::CmdInfoBreakpoints(const std::string& Name, const std::vector<std::string>& Arguments) {
-  if (Arguments.size() != 1) {
-    FOutput.Error(Name, "usage: info breakpoints");
-    return;
-  }
+void TCliSession::CmdInfo(const std::string& Name, const std::vector<std::string>& /*Arguments*/) {
   nlohmann::json List = nlohmann::json::array();
   std::string Text = FBreakpoints.empty() ? "No breakpoints.\n" : "Num  Type        Enb  Hits  Where\n";
   for (const auto& [Id, Breakpoint] : FBreakpoints) {

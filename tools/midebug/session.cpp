@@ -107,14 +107,14 @@ const std::vector<TCliSession::TCommandEntry>& TCliSession::Commands() {
       {"delete", &TCliSession::CmdDelete, 1000, "delete [N...]", "delete breakpoints (all without N)"},
       {"enable", &TCliSession::CmdEnable, 1000, "enable N...", "enable breakpoints"},
       {"disable", &TCliSession::CmdEnable, 1000, "disable N...", "disable breakpoints"},
+      {"info breakpoints", &TCliSession::CmdInfo, 0, "info breakpoints", "the breakpoints with their hit counts"},
       {"ignore", &TCliSession::CmdIgnore, 2, "ignore N COUNT", "let breakpoint N pass its next COUNT hits"},
       {"catch", &TCliSession::CmdCatch, 1, "catch throw|catch|raise",
        "stop where a C++ exception is thrown or caught, or a Pascal one raised"},
       {"uncatch", &TCliSession::CmdCatch, 1, "uncatch [throw|catch|raise]", "stop catching (all without a kind)"},
       {"list", &TCliSession::CmdList, 1, "list [FILE:]LINE | FUNCTION",
        "ten source lines around LINE or FUNCTION, the current line marked"},
-      {"info", &TCliSession::CmdInfo, 2, "info breakpoints | line FILE:LINE | line *ADDRESS",
-       "the breakpoints with their hit counts, or the code addresses of a source line"},
+      {"info line", &TCliSession::CmdInfoLine, 1, "info line FILE:LINE | *ADDRESS", "the code addresses of a source line"},
       {"jump", &TCliSession::CmdJump, 1, "jump LINE",
        "make LINE of the current function the next statement ('continue' runs on from there)"},
       {"help", &TCliSession::CmdHelp, 0, "help", "this list"},
@@ -229,17 +229,6 @@ bool TCliSession::Execute(const std::string& Line) {
   }
   FOutput.Error(Name, "unknown command '" + Name + "'; 'help' lists the commands");
   return true;
-}
-
-void TCliSession::CmdInfo(const std::string& Name, const std::vector<std::string>& Arguments) {
-  static const std::set<std::string> Breakpoints = {"breakpoints", "break", "b", "watchpoints"};
-  const std::string Subject = Arguments.empty() ? "" : Arguments[0];
-  if (Breakpoints.contains(Subject))
-    CmdInfoBreakpoints(Name, Arguments);
-  else if (Subject == "line")
-    CmdInfoLine(Name, Arguments);
-  else
-    FOutput.Error(Name, "usage: info breakpoints | line LOCATION | registers [WHICH]");
 }
 
 void TCliSession::End() {

@@ -114,8 +114,6 @@ private:
   void CmdDetach(const std::string& Name, const std::vector<std::string>& Arguments);
   void CmdQuit(const std::string& Name, const std::vector<std::string>& Arguments);
   void CmdHelp(const std::string& Name, const std::vector<std::string>& Arguments);
-  /// "info SUBJECT ...": hands the words to the subject's command.
-  void CmdInfo(const std::string& Name, const std::vector<std::string>& Arguments);
 
   // --- Memory, disassembly and registers (memorycommands.cpp) -------------
   void CmdExamine(const std::string& Name, const std::vector<std::string>& Arguments);
@@ -150,7 +148,7 @@ private:
   void CmdWatch(const std::string& Name, const std::vector<std::string>& Arguments);
   void CmdDelete(const std::string& Name, const std::vector<std::string>& Arguments);
   void CmdEnable(const std::string& Name, const std::vector<std::string>& Arguments);
-  void CmdInfoBreakpoints(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdInfo(const std::string& Name, const std::vector<std::string>& Arguments);
   void CmdIgnore(const std::string& Name, const std::vector<std::string>& Arguments);
   void CmdCatch(const std::string& Name, const std::vector<std::string>& Arguments);
   using TPlace = std::function<void(IGDBProcess& Process, const TIntfPtr<IGDBBreakpointListener>& Listener)>;
