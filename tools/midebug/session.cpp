@@ -6,6 +6,7 @@
 #include <cstdlib>
 #include <filesystem>
 #include <sstream>
+#include <string_view>
 
 namespace midebug::cli {
 
@@ -93,9 +94,17 @@ const std::vector<TCliSession::TCommandEntry>& TCliSession::Commands() {
        "end the session (a launched program is killed, an attached one detached)"},
       {"list", &TCliSession::CmdList, 1, "list [FILE:]LINE | FUNCTION",
        "ten source lines around LINE or FUNCTION, the current line marked"},
-      {"info", &TCliSession::CmdInfo, 2, "info line FILE:LINE | *ADDRESS", "the code addresses of a source line"},
+      {"info line", &TCliSession::CmdInfoLine, 1, "info line FILE:LINE | *ADDRESS",
+       "the code addresses of a source line"},
       {"jump", &TCliSession::CmdJump, 1, "jump LINE",
        "make LINE of the current function the next statement ('continue' runs on from there)"},
+      {"x", &TCliSession::CmdExamine, 2, "x ADDRESS [COUNT]", "COUNT bytes of memory at ADDRESS (64), in hex and text"},
+      {"write", &TCliSession::CmdWrite, 2, "write ADDRESS HEXBYTES", "write bytes (\"90c3\") to memory at ADDRESS"},
+      {"disassemble", &TCliSession::CmdDisassemble, 2, "disassemble [ADDRESS] [COUNT]",
+       "COUNT instructions (20) from ADDRESS, by default from the start of the current function"},
+      {"info registers", &TCliSession::CmdInfoRegisters, 1, "info registers [general|fpu|sse|NAME]",
+       "the registers of the current thread"},
+      {"set register", &TCliSession::CmdSetRegister, 2, "set register NAME VALUE", "write a register"},
       {"help", &TCliSession::CmdHelp, 0, "help", "this list"},
   };
   return Table;
@@ -184,18 +193,24 @@ bool TCliSession::Execute(const std::string& Line) {
   const std::string Name = Words.front();
   Words.erase(Words.begin());
   for (const TCommandEntry& Entry : Commands()) {
-    if (Name != Entry.Name)
+    // A command of two words ("info registers") takes the second as well.
+    const std::string_view EntryName = Entry.Name;
+    const size_t Blank = EntryName.find(' ');
+    if (EntryName.substr(0, Blank) != Name ||
+        (Blank != std::string_view::npos && (Words.empty() || EntryName.substr(Blank + 1) != Words.front())))
       continue;
+    if (Blank != std::string_view::npos)
+      Words.erase(Words.begin());
     if (Words.size() > Entry.MaxArguments) {
-      FOutput.Error(Name, Entry.MaxArguments == 0 ? "'" + Name + "' takes no arguments"
-                                                  : "usage: " + std::string(Entry.Usage));
+      FOutput.Error(Entry.Name, Entry.MaxArguments == 0 ? "'" + std::string(Entry.Name) + "' takes no arguments"
+                                                        : "usage: " + std::string(Entry.Usage));
       return true;
     }
     try {
-      (this->*Entry.Handler)(Name, Words);
+      (this->*Entry.Handler)(Entry.Name, Words);
     } catch (const std::exception& Error) {
       // The library raises at its boundary when the debugger fails.
-      FOutput.Error(Name, Error.what());
+      FOutput.Error(Entry.Name, Error.what());
     }
     return !FQuit;
   }
@@ -223,6 +238,13 @@ void TCliSession::End() {
 }
 
 bool TCliSession::EndProgram(TEnding How) {
+  // Both pause the program first, which the library skips while it still
+  // counts the program as stopped: the resume must be under way.
+  const auto Deadline = std::chrono::steady_clock::now() + EndWait;
+  while (FState == TRunState::Running && !FResumeConfirmed && std::chrono::steady_clock::now() < Deadline)
+    WaitAndProcess(PumpSlice);
+  if (FState != TRunState::Running && FState != TRunState::Stopped)
+    return true;
   const uint64_t Before = FStopCount;
   FEnding = How;
   if (How == TEnding::Detach)
@@ -256,6 +278,9 @@ bool TCliSession::HandleSignals() {
 
 void TCliSession::RequestPause() {
   FPausing = true;
+  // The library ignores a pause until the debugger has said the program
+  // runs: one asked for sooner is asked again then.
+  FPauseWhenResumed = !FResumeConfirmed;
   try {
     FProcess->Pause();
   } catch (const std::exception& Error) {
@@ -336,6 +361,10 @@ void TCliSession::ResumeAndWait(const std::string& Name, const std::function<voi
   // Counted before resuming, so that a stop reported during the resuming
   // call itself is not missed.
   const uint64_t Before = FStopCount;
+  // The library counts a program it saw stopped as stopped until the
+  // debugger reports it running again; a launch it never counted so.
+  if (FState == TRunState::Stopped)
+    FResumeConfirmed = false;
   Resume();
   if (!FWaitForStops) {
     // The prompt comes back at once; the stop is printed when it comes.
@@ -420,6 +449,9 @@ void TCliSession::CmdStart(const std::string& Name, const std::vector<std::strin
     FOutput.Error(Name, "the program has no main function; 'run' runs it");
     return;
   }
+  // The debugger accepts a breakpoint on a main it has not found yet, in
+  // case a library brings one: an end before any stop means there was none.
+  FAwaitingMain = true;
   ResumeAndWait(Name, [this] { FProcess->Run(); });
 }
 
@@ -624,6 +656,8 @@ void TCliSession::CmdHelp(const std::string& Name, const std::vector<std::string
     Usage.resize(std::max<size_t>(Usage.size(), 10), ' ');
     Text += "  " + Usage + "  " + Entry.Help + "\n";
   }
+  Text += "While the program runs: pause (or Ctrl-C), kill, detach, threads, quit.\n"
+          "The program's input is empty unless midebug was started with --stdin FILE or --tty DEVICE.\n";
   FOutput.Emit({{"answer", Name}, {"commands", List}}, Text);
 }
 

@@ -114,7 +114,7 @@ private:
 
   // --- Source lines (sourcecommands.cpp) ---------------------------------
   void CmdList(const std::string& Name, const std::vector<std::string>& Arguments);
-  void CmdInfo(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdInfoLine(const std::string& Name, const std::vector<std::string>& Arguments);
   void CmdJump(const std::string& Name, const std::vector<std::string>& Arguments);
   /// Where the program stands in the current thread and frame, or the empty
   /// location.
@@ -123,6 +123,13 @@ private:
   /// Line; empty when none is found.
   std::string SourcePath(const std::string& Name, Integer Line);
   // -------------------------------------------------------------------------
+  // --- Memory, disassembly and registers (memorycommands.cpp) -------------
+  void CmdExamine(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdWrite(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdDisassemble(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdInfoRegisters(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdSetRegister(const std::string& Name, const std::vector<std::string>& Arguments);
+  // --- End of memory, disassembly and registers ----------------------------
 
   /// Has the debugger load the program (again); raises when it cannot.
   void Load(TGDBLanguage Language, TGDBCPU CPU);
@@ -179,6 +186,12 @@ private:
   bool FWaitForStops = true;
   /// Set by a pause the session asked for, until the stop it brings.
   bool FPausing = false;
+  /// Set by 'start' until the program first stops.
+  bool FAwaitingMain = false;
+  /// Whether the library has reported the program running since the last
+  /// resume, and a pause waits for that.
+  bool FResumeConfirmed = true;
+  bool FPauseWhenResumed = false;
   /// The end the session itself asked for, so that it is reported as such.
   TEnding FEnding = TEnding::None;
   /// The last signal reported, for the stop it brings.
