@@ -336,7 +336,7 @@ TEST_F(CliTest, CliListsSourceShowsALinesCodeAndMovesTheNextStatement) {
   EXPECT_EQ(AtStart[4]["text"], "  int total = 0;");
   EXPECT_EQ(Lists[2]["error"], "no function or line 'nosuch'");
 
-  const std::vector<json> Infos = Answers("info");
+  const std::vector<json> Infos = Answers("info line");
   ASSERT_EQ(Infos.size(), 2u) << Run.Stdout;
   EXPECT_EQ(Infos[0]["line"], 9);
   EXPECT_EQ(FileName(Infos[0]), "sourcelines.c");

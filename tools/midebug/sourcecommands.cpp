@@ -113,13 +113,13 @@ void TCliSession::CmdList(const std::string& Name, const std::vector<std::string
 
 void TCliSession::CmdInfoLine(const std::string& Name, const std::vector<std::string>& Arguments) {
   const std::string Usage = "usage: info line FILE:LINE | *ADDRESS";
-  if (Arguments.size() != 2 || Arguments[0] != "line") {
+  if (Arguments.size() != 1) {
     FOutput.Error(Name, Usage);
     return;
   }
   if (FState != TRunState::Loaded && !RequireStopped(Name))
     return;
-  const std::string& Where = Arguments[1];
+  const std::string& Where = Arguments[0];
   UInt64 Address = 0;
   std::string File;
   Integer Line = 0;
