@@ -351,6 +351,9 @@ bool DecodeVarCreate(TVarCreateResult& Create, TMIScanner& Scanner) {
   Create.FValue = Text(Scanner.FindValue("value"));
   if (!Create.FValue.empty())
     Create.FValueDefined = true;
+  Create.FDynamic = Scanner.FindValue("dynamic") == "1";
+  Create.FHasMore = Scanner.FindInteger("has_more", 0) != 0;
+  Create.FDisplayHint = Text(Scanner.FindValue("displayhint"));
   return true;
 }
 
@@ -361,6 +364,7 @@ bool DecodeVarInfoNumChildren(TVarInfoNumChildrenResult& Info, TMIScanner& Scann
 
 bool DecodeVarListChildren(TVarListChildrenResult& List, TMIScanner& Scanner) {
   const Integer Count = ReadNumChild(Scanner);
+  List.FHasMore = Scanner.FindInteger("has_more", 0) != 0;
   if (Count <= 0)
     return true;
   std::string_view Children;
@@ -373,6 +377,7 @@ bool DecodeVarListChildren(TVarListChildrenResult& List, TMIScanner& Scanner) {
     Child.Expr = Text(Scanner.FindValue("exp"));
     Child.NumChild = ReadNumChild(Scanner);
     Child.VarType = Text(Scanner.FindValue("type"));
+    Child.Dynamic = Scanner.FindValue("dynamic") == "1";
   }
   return Present;
 }

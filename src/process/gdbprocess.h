@@ -134,10 +134,9 @@ public:
   Integer GetPid() override;
   UInt64 GetBaseAddress() override { return FBaseAddress; }
   TGDBModule GetModule(Integer Id) override { return FModules.Current(Id); }
-
   bool CanSetRunToMainBreakpoint() const { return FBreakOnMain != nullptr; } ///< run-to-main breakpoint placed
-
   TGDBThreadTable& Threads() { return *FThreads; }
+  TGDBEvaluator& Evaluator() { return *FEvaluator; }
   TGDBKernel& Kernel() { return *FKernel; }
   TGDBCPU CPU() const { return FRequests.CPU(); }
   const TWaitPolicy& WaitPolicy() const { return FRequests.Policy(); }
@@ -201,6 +200,7 @@ private:
   TInspectPtr<TGDBLineCache> FLines;
   TInspectPtr<TGDBMemoryCache> FMemory;
   TInspectPtr<TGDBRegisterIds> FRegisters;
+  TInspectPtr<TGDBEvaluator> FEvaluator;
   TIntfPtr<IGDBBreakpointListener> FBreakOnMain;
   TGDBConsoleQuery FLanguageQuery{"show language", "The current source language is \"", '"'}; ///< GDB 13's words
   TProgramTerminal FTerminal;
