@@ -131,9 +131,9 @@ TEST_F(EvaluateInC, OnlyTheLastEvaluationsVariableObjectStaysAndNamesAreNeverReu
 }
 
 TEST_F(EvaluateInC, RequestsWhileTheProgramRunsAreRefused) {
-  Thread(); // the thread as the IDE held it at the stop
   const TIntfPtr<IGDBThread> Stopped = Thread();
   Process->Resume();
+  ASSERT_TRUE(Listener->PumpUntilCall("Resumed("));
   std::string Value, TypeName;
   bool CanModify = true;
   EXPECT_EQ(Stopped->Evaluate("number", "", 1, Value, CanModify, TypeName), ercError);

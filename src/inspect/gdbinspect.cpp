@@ -29,6 +29,19 @@ std::string FunctionOf(const std::string& Header) {
 
 } // namespace
 
+struct TGDBInspect::TVarObject {
+  TVarObject(TGDBEvaluator& Evaluator, const TIntfPtr<IGDBProcess>& Process, const std::string& Name)
+      : FEvaluator(Evaluator), FProcess(Process), FName(Name) {}
+  ~TVarObject() { FEvaluator.VarDelete(FName); }
+  TVarObject(const TVarObject&) = delete;
+  TVarObject& operator=(const TVarObject&) = delete;
+
+  TGDBEvaluator& FEvaluator;
+  /// The process outlives the deletion.
+  TIntfPtr<IGDBProcess> FProcess;
+  std::string FName;
+};
+
 TGDBInspect::TGDBInspect(TGDBProcess& Process, const TIntfPtr<IGDBThread>& Thread, const std::string& Expr,
                          Integer NumChildren)
     : FProcess(Process), FProcessRef(static_cast<IGDBProcess*>(&Process)), FThread(Thread), FExpr(Expr) {
@@ -63,9 +76,6 @@ TGDBInspect::TGDBInspect(const std::string& Expr, UInt64 Address, TGDBProcess& P
 }
 
 TGDBInspect::~TGDBInspect() {
-  // GDB deletes a variable object's children with it.
-  if (!FAutoDelete && !FName.empty())
-    Evaluator().VarDelete(FName);
   if (FRegistered)
     ThreadOf(FThread).RemoveInspect(FName);
 }
@@ -74,6 +84,8 @@ TGDBEvaluator& TGDBInspect::Evaluator() { return FProcess.Evaluator(); }
 
 void TGDBInspect::SetName(const std::string& Name, bool Register) {
   FName = Name;
+  if (!Register && !Name.empty())
+    FVarObject = std::make_shared<TVarObject>(Evaluator(), FProcessRef, Name);
   if (!Register || !FThread)
     return;
   ThreadOf(FThread).AddInspect(Name, this);
@@ -82,11 +94,12 @@ void TGDBInspect::SetName(const std::string& Name, bool Register) {
 
 void TGDBInspect::SetNumChildren(Integer Count) {
   FNumChildren = std::max(Count, 0);
-  FChildren.resize(static_cast<size_t>(FNumChildren));
+  FChildren.erase(FChildren.lower_bound(FNumChildren), FChildren.end());
 }
 
 void TGDBInspect::FillPlaceholders(const std::string& Error) {
-  for (TIntfPtr<TGDBInspect>& Slot : FChildren) {
+  for (Integer Index = 0; Index < FNumChildren; ++Index) {
+    TIntfPtr<TGDBInspect>& Slot = FChildren[Index];
     if (Slot)
       continue;
     Slot = new TGDBInspect(FProcess, FThread, "?", 0);
@@ -99,14 +112,15 @@ void TGDBInspect::FillPlaceholders(const std::string& Error) {
 
 bool TGDBInspect::StoreChildren(const TGDBVarChildArray& Children, Integer First) {
   for (size_t Index = 0; Index < Children.size(); ++Index) {
-    const size_t Slot = static_cast<size_t>(First) + Index;
-    if (Slot >= FChildren.size())
+    const Integer Slot = First + static_cast<Integer>(Index);
+    if (Slot >= FNumChildren)
       return true;
     const TGDBVarChild& Record = Children[Index];
     TIntfPtr<TGDBInspect> Child(new TGDBInspect(FProcess, FThread, Record.Expr, Record.NumChild));
     Child->FType = Record.VarType;
     Child->FAutoDelete = true;
     Child->FDynamic = Record.Dynamic;
+    Child->FVarObject = FVarObject;
     // A child's own pretty printer is asked for its children when opened.
     if (Record.Dynamic && Record.NumChild == 0)
       Child->SetNumChildren(1);
@@ -140,17 +154,15 @@ void TGDBInspect::ListChildren(Integer Index) {
   Integer End = std::min(FNumChildren, Index + TGDBEvaluator::ChildWindow);
   if (FRangeCount > 0 && Index >= FRangeStart && Index < FRangeStart + FRangeCount)
     End = std::min(End, FRangeStart + FRangeCount);
-  for (Integer Slot = Index + 1; Slot < End; ++Slot)
-    if (FChildren[static_cast<size_t>(Slot)]) {
-      End = Slot;
-      break;
-    }
+  const auto Next = FChildren.upper_bound(Index);
+  if (Next != FChildren.end() && Next->first < End)
+    End = Next->first;
   const bool Ok = Evaluator().VarListChildren(FName, Index, End, Listed);
   if (Ok && StoreChildren(Listed.FChildren, Index))
     return;
   const std::string Error = Ok ? std::string(InvalidInspector) : Listed.FErrorMessage;
   for (Integer Slot = Index; Slot < End; ++Slot) {
-    TIntfPtr<TGDBInspect>& Child = FChildren[static_cast<size_t>(Slot)];
+    TIntfPtr<TGDBInspect>& Child = FChildren[Slot];
     if (Child)
       continue;
     Child = new TGDBInspect(FProcess, FThread, "?", 0);
@@ -193,11 +205,11 @@ void TGDBInspect::ListDynamicChildren() {
   if (!FMapHint)
     return;
   // Key and value children in turn: one member per pair, named by its key.
-  std::vector<TIntfPtr<TGDBInspect>> Pairs;
-  for (size_t Key = 0; Key + 1 < FChildren.size(); Key += 2) {
+  std::map<Integer, TIntfPtr<TGDBInspect>> Pairs;
+  for (Integer Key = 0; Key + 1 < FNumChildren; Key += 2) {
     FChildren[Key]->FetchValueAndAttribute();
     FChildren[Key + 1]->FExpr = FChildren[Key]->FValue;
-    Pairs.push_back(FChildren[Key + 1]);
+    Pairs[Key / 2] = FChildren[Key + 1];
   }
   FChildren = std::move(Pairs);
   FNumChildren = static_cast<Integer>(FChildren.size());
@@ -208,13 +220,12 @@ TIntfPtr<TGDBInspect> TGDBInspect::GetChildren(Integer Index) {
     ListDynamicChildren();
   if (Index < 0 || Index >= FNumChildren)
     return nullptr;
-  if (!FChildren[static_cast<size_t>(Index)])
+  if (!FChildren.contains(Index))
     ListChildren(Index);
-  if (Index >= FNumChildren)
+  const auto Slot = FChildren.find(Index);
+  if (Slot == FChildren.end() || !Slot->second)
     return nullptr;
-  TIntfPtr<TGDBInspect> Child = FChildren[static_cast<size_t>(Index)];
-  if (!Child)
-    return nullptr;
+  TIntfPtr<TGDBInspect> Child = Slot->second;
   if (Child->FName.empty() && !Child->FError) {
     SelectOwnFrame();
     Child->CreateVariableObject();
@@ -366,7 +377,7 @@ bool TGDBInspect::Update() {
   }
   if (!FProcess.IsLLDB())
     return true;
-  for (const TIntfPtr<TGDBInspect>& Child : FChildren)
+  for (const auto& [Index, Child] : FChildren)
     if (Child && !Child->Update())
       return false;
   return true;
@@ -407,7 +418,7 @@ void TGDBLocalInspect::Reset(Integer CallCount, const TStringArray& Params, cons
   FLocalCount = static_cast<Integer>(Locals.size());
   FChildren.clear();
   SetNumChildren(static_cast<Integer>(Params.size() + Locals.size()));
-  size_t Slot = 0;
+  Integer Slot = 0;
   for (const TStringArray* Names : {&Params, &Locals})
     for (const std::string& Name : *Names)
       FChildren[Slot++] = new TGDBInspect(FProcess, FThread, Name, 0);
@@ -428,8 +439,8 @@ bool TGDBLocalInspect::Refresh() {
   TGDBThread& Thread = ThreadOf(FThread);
   bool Rebuild = Thread.GetCallCount() != FCallCount || Evaluator().GetLocalVarsCount() != FLocalCount ||
                  FrameKey() != FFrameKey;
-  for (size_t Index = 0; !Rebuild && Index < FChildren.size(); ++Index)
-    Rebuild = FChildren[Index] && !FChildren[Index]->Update();
+  for (auto Child = FChildren.begin(); !Rebuild && Child != FChildren.end(); ++Child)
+    Rebuild = Child->second && !Child->second->Update();
   if (!Rebuild)
     return false;
   FChildren.clear();

@@ -5,8 +5,9 @@
 
 #include "process/gdbinterfaces.h"
 
+#include <map>
+#include <memory>
 #include <string>
-#include <vector>
 
 namespace midebug {
 
@@ -80,6 +81,10 @@ protected:
   /// variable object.
   TIntfPtr<IGDBProcess> FProcessRef;
   TIntfPtr<IGDBThread> FThread;
+  /// The root's variable object, deleted when the root and every child
+  /// handed out are gone: GDB deletes the children with it.
+  struct TVarObject;
+  std::shared_ptr<TVarObject> FVarObject;
   std::string FExpr;
   std::string FFullExpr;
   bool FFullExprDefined = false;
@@ -88,7 +93,8 @@ protected:
   std::string FValue;
   bool FValueDefined = false;
   bool FEditable = false;
-  std::vector<TIntfPtr<TGDBInspect>> FChildren;
+  /// The children listed so far, by index: a huge array holds a window.
+  std::map<Integer, TIntfPtr<TGDBInspect>> FChildren;
   Integer FNumChildren = 0;
   bool FAutoDelete = true;
   bool FRegistered = false;

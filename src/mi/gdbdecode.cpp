@@ -8,6 +8,7 @@
 #include "mi/gdbdecodeinternal.h"
 #include "mi/gdboutput.h"
 
+#include <algorithm>
 #include <map>
 
 namespace midebug {
@@ -346,7 +347,8 @@ bool DecodeSymbolListLines(TSymbolListLinesResult& Lines, TMIScanner& Scanner) {
 
 bool DecodeVarCreate(TVarCreateResult& Create, TMIScanner& Scanner) {
   Create.FName = Text(Scanner.FindValue("name"));
-  Create.FNumChild = ReadNumChild(Scanner);
+  // The whole count: the children are listed a window at a time.
+  Create.FNumChild = std::max(Scanner.FindInteger("numchild", 0), 0);
   Create.FType = Text(Scanner.FindValue("type"));
   Create.FValue = Text(Scanner.FindValue("value"));
   if (!Create.FValue.empty())
