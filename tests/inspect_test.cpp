@@ -143,3 +143,56 @@ TEST_F(InspectInC, TheLocalsViewOfTwoHundredLocalsIsRebuiltWhenTheFrameChanges) 
 
 } // namespace
 } // namespace midebug
+
+namespace midebug {
+namespace {
+
+using Strings = std::vector<std::string>;
+
+/// tests/debuggees/cppvalues.cpp, first before its containers are built,
+/// then once they hold their values.
+class InspectInCpp : public test::ValueSession {
+protected:
+  void SetUp() override {
+    ValueSession::SetUp();
+    ASSERT_NO_FATAL_FAILURE(Launch(test::Debuggee("cppvalues"), glCPP,
+                                   {At("cppvalues.cpp", "line:fresh"), At("cppvalues.cpp", "line:show")}));
+  }
+};
+
+TEST_F(InspectInCpp, ContainersReadThroughPrettyPrintersAndUninitialisedOnesDoNotHang) {
+  // Garbage storage: the printers may claim anything, the listing stops.
+  for (const char* Expr : {"fresh", "ages"}) {
+    const TIntfPtr<IGDBInspect> Garbage = Thread()->CreateInspector(Expr, 1);
+    EXPECT_LE(Garbage->GetMemberCount(), 10000) << Expr;
+  }
+  ASSERT_NO_FATAL_FAILURE(Continue());
+
+  EXPECT_EQ(Eval("text"), "\"hello\"");
+  const TIntfPtr<IGDBInspect> Copy = Thread()->CreateInspector("copy", 1);
+  EXPECT_EQ(Copy->GetKind(), ikObject);
+  EXPECT_TRUE(Copy->GetFlags() & InspectFlagBit(ifCanInspect));
+  ASSERT_EQ(Copy->GetMemberCount(), 250) << "listed in windows until the printer had no more";
+  EXPECT_EQ(Member(Copy, 0), "[0]=0");
+  EXPECT_EQ(Member(Copy, 249), "[249]=498");
+  EXPECT_EQ(Copy->CreateSubInspector(iiVariable, 3)->GetFullExpr(), "[3]")
+      << "GDB has no path for a printer's child: the expression listed stands in";
+
+  EXPECT_EQ(Members(Thread()->CreateInspector("ages", 1)), (Strings{"\"ann\"=31", "\"bob\"=42"}));
+}
+
+TEST_F(InspectInCpp, AClassShowsItsBasesAndItsMembersUnderTheirAccessGroups) {
+  ASSERT_NO_FATAL_FAILURE(Continue());
+  const TIntfPtr<IGDBInspect> Square = Thread()->CreateInspector("square", 1);
+  EXPECT_EQ(Members(Square), (Strings{"Named={...}", "Counted={...}", "public=", "private=", "protected="}));
+  EXPECT_EQ(Members(Square->CreateSubInspector(iiVariable, 2)), (Strings{"side=4"}));
+  EXPECT_EQ(Members(Square->CreateSubInspector(iiVariable, 3)), (Strings{"ratio=0.5"}));
+  EXPECT_EQ(Members(Square->CreateSubInspector(iiVariable, 4)), (Strings{"area=16"}));
+  const TIntfPtr<IGDBInspect> Counted = Square->CreateSubInspector(iiVariable, 1);
+  EXPECT_EQ(Members(Counted->CreateSubInspector(iiVariable, 0)), (Strings{"count=2"}));
+  const TIntfPtr<IGDBInspect> Named = Square->CreateSubInspector(iiVariable, 0);
+  EXPECT_EQ(Members(Named->CreateSubInspector(iiVariable, 0)), (Strings{"label=\"shape\""}));
+}
+
+} // namespace
+} // namespace midebug
