@@ -196,3 +196,58 @@ TEST_F(InspectInCpp, AClassShowsItsBasesAndItsMembersUnderTheirAccessGroups) {
 
 } // namespace
 } // namespace midebug
+
+namespace midebug {
+namespace {
+
+using Strings = std::vector<std::string>;
+
+/// tests/debuggees/pasvalues.pas stopped in Total, whose parameter is an
+/// open array, built with the default debug format and with DWARF 3.
+class InspectInPascal : public test::ValueSession, public ::testing::WithParamInterface<const char*> {
+protected:
+  void SetUp() override {
+    ValueSession::SetUp();
+    ASSERT_NO_FATAL_FAILURE(Launch(test::Debuggee(GetParam()), glPascal, {At("pasvalues.pas", "line:total-body")}));
+  }
+};
+
+TEST_P(InspectInPascal, EveryKindOfValueShowsWithoutKillingGdb) {
+  const struct {
+    const char* Expr;
+    const char* Value; // what the value holds
+  } Cases[] = {
+      {"Fixed", "{11, 22, 33, 44, 55}"}, {"Growing", ""}, {"Items", ""}, {"Short", "'short text'"},
+      {"Ansi", "'ansi text'"}, {"Wide", "'wide text'"}, {"Pair", "{Left = 1, Right = 2}"}, {"Shape", "0x"},
+      {"Colours", "[Red, Blue]"}, {"Colour", "Green"}, {"Index", ""}, {"Fixed[2]", "22"},
+  };
+  for (const auto& Case : Cases) {
+    std::string Value = Eval(Case.Expr);
+    EXPECT_FALSE(Value.starts_with("error:")) << Case.Expr << ": " << Value;
+    for (char& Letter : Value)
+      Letter = static_cast<char>(std::toupper(static_cast<unsigned char>(Letter)));
+    std::string Expected = Case.Value;
+    for (char& Letter : Expected)
+      Letter = static_cast<char>(std::toupper(static_cast<unsigned char>(Letter)));
+    EXPECT_NE(Value.find(Expected), std::string::npos) << Case.Expr << ": " << Value;
+
+    const TIntfPtr<IGDBInspect> Inspector = Thread()->CreateInspector(Case.Expr, 1);
+    for (Integer Index = 0; Index < std::min(Inspector->GetMemberCount(), 3); ++Index) {
+      const TIntfPtr<IGDBInspect> Child = Inspector->CreateSubInspector(iiVariable, Index);
+      if (Child)
+        Child->GetMemberCount();
+    }
+  }
+  const TIntfPtr<IGDBInspect> Locals = Thread()->CreateLocalVarsInspector(1);
+  EXPECT_GE(Members(Locals).size(), 2u);
+  const TIntfPtr<IGDBInspect> Pair = Thread()->CreateInspector("Pair", 1);
+  ASSERT_EQ(Members(Pair).size(), 2u);
+  EXPECT_TRUE(Members(Pair)[1].ends_with("=2")) << Members(Pair)[1];
+  EXPECT_EQ(Eval("1+1"), "2") << "GDB is alive";
+  EXPECT_FALSE(Listener->HasCall("Exited"));
+}
+
+INSTANTIATE_TEST_SUITE_P(DebugFormats, InspectInPascal, ::testing::Values("pasvalues", "pasvalues-gw3"));
+
+} // namespace
+} // namespace midebug

@@ -3,6 +3,8 @@
 #include "inspect/gdbinspect.h"
 #include "process/gdbprocess.h"
 
+#include <cctype>
+
 namespace midebug {
 
 namespace {
@@ -25,6 +27,19 @@ bool FormatOfSuffix(const std::string& Suffix, TDataValueFormat& Format) {
   return true;
 }
 
+/// A Pascal name path (letters, digits, "_", ".", indexes) in capitals; any
+/// other expression unchanged.
+std::string PascalCapitals(const std::string& Expr) {
+  std::string Capitals = Expr;
+  for (char& Character : Capitals) {
+    const unsigned char Byte = static_cast<unsigned char>(Character);
+    if (!std::isalnum(Byte) && Character != '_' && Character != '.' && Character != '[' && Character != ']')
+      return Expr;
+    Character = static_cast<char>(std::toupper(Byte));
+  }
+  return Capitals;
+}
+
 /// The text a failed request leaves: the debugger's message, or why no
 /// answer came.
 std::string ErrorText(const TGDBResult& Result) {
@@ -44,6 +59,29 @@ private:
   std::atomic<bool>& FFlag;
   const bool FBefore;
 };
+
+/// GDB dies printing the type of a Pascal array, and every command that
+/// names a variable object's type prints it: a Pascal program's objects are
+/// made and listed with the language set to C.
+class TGDBEvaluator::TCLanguageScope {
+public:
+  explicit TCLanguageScope(TGDBEvaluator& Evaluator) : FEvaluator(Evaluator), FActive(Evaluator.PascalOnGDB()) {
+    if (FActive)
+      FEvaluator.FProcess.Requests().Fire(&TGDBCommand::CreateGDBSetCommand, "language", "c");
+  }
+  ~TCLanguageScope() {
+    if (FActive)
+      FEvaluator.FProcess.Requests().Fire(&TGDBCommand::CreateGDBSetCommand, "language", "auto");
+  }
+  TCLanguageScope(const TCLanguageScope&) = delete;
+  TCLanguageScope& operator=(const TCLanguageScope&) = delete;
+
+private:
+  TGDBEvaluator& FEvaluator;
+  const bool FActive;
+};
+
+bool TGDBEvaluator::PascalOnGDB() { return !FProcess.IsLLDB() && FProcess.GetEvaluator() == glPascal; }
 
 TGDBEvaluator::TGDBEvaluator(TGDBProcess& Process, std::atomic<bool>& Evaluating,
                              const std::atomic<Integer>& MaxChildrenCount)
@@ -67,14 +105,27 @@ void TGDBEvaluator::Prepare() {
 void TGDBEvaluator::VarCreate(const std::string& Expr, UInt64 Address, TVarCreateResult& Created) {
   Prepare();
   TEvaluatingScope Evaluating(FEvaluating);
-  const bool AsC = !FProcess.IsLLDB() && FProcess.GetEvaluator() == glPascal;
-  if (AsC)
-    FProcess.Requests().Fire(&TGDBCommand::CreateGDBSetCommand, "language", "c");
-  FProcess.Requests().Ask(Created, [&](TGDBCommand& Command, std::string& Token) {
-    return Command.CreateVarCreateCommand(Token, GetUniqueVarName(), Expr, Address);
-  });
-  if (AsC)
-    FProcess.Requests().Fire(&TGDBCommand::CreateGDBSetCommand, "language", "auto");
+  const bool AsC = PascalOnGDB();
+  const TCLanguageScope InC(*this);
+  auto Create = [&](const std::string& Sent, TVarCreateResult& Result) {
+    return FProcess.Requests().Ask(Result, [&](TGDBCommand& Command, std::string& Token) {
+      return Command.CreateVarCreateCommand(Token, GetUniqueVarName(), Sent, Address);
+    });
+  };
+  Create(Expr, Created);
+  // C matches names by case; Free Pascal's default debug format writes
+  // them in capitals.
+  const std::string Capitals = PascalCapitals(Expr);
+  TVarCreateResult Retry;
+  if (AsC && Created.FError && !Created.FTimeOut && Capitals != Expr && Create(Capitals, Retry)) {
+    Created.FError = false;
+    Created.FErrorMessage.clear();
+    Created.FName = Retry.FName;
+    Created.FNumChild = Retry.FNumChild;
+    Created.FType = Retry.FType;
+    Created.FValue = Retry.FValue;
+    Created.FValueDefined = Retry.FValueDefined;
+  }
   if (!Created.FError && !Created.FAvailable) {
     Created.FError = true;
     Created.SetErrorMessage(ErrorText(Created));
@@ -110,6 +161,7 @@ void TGDBEvaluator::VarDelete(const std::string& Name) {
 bool TGDBEvaluator::VarListChildren(const std::string& Name, Integer From, Integer To,
                                     TVarListChildrenResult& Children) {
   TEvaluatingScope Evaluating(FEvaluating);
+  const TCLanguageScope InC(*this);
   if (From < 0)
     return FProcess.Requests().Ask(Children, [&](TGDBCommand& Command, std::string& Token) {
       return Command.CreateVarListChildrenCommand(Token, Name, FProcess.IsLLDB(), Quoted(), pvfNoValues);
@@ -140,6 +192,7 @@ bool TGDBEvaluator::VarAssign(const std::string& Name, const std::string& TypeNa
 
 bool TGDBEvaluator::VarUpdate(const std::string& Name, TVarUpdateResult& Update) {
   TEvaluatingScope Evaluating(FEvaluating);
+  const TCLanguageScope InC(*this);
   return FProcess.Requests().Ask(Update, &TGDBCommand::CreateVarUpdateCommand, Name, pvfAllValues, Quoted());
 }
 
@@ -192,6 +245,12 @@ TGDBRetCode TGDBEvaluator::Evaluate(const std::string& Expr, const std::string& 
     if (Format != dvfNatural &&
         FProcess.Requests().Ask(Formatted, &TGDBCommand::CreateVarSetFormatCommand, Created.FName, Format, Quoted()))
       Created.FValue = Formatted.FValue;
+    // The object was read as C; the value is shown as Pascal writes it
+    // (strings, sets, arrays), which evaluating alone does safely.
+    TDataEvaluateExpressionResult AsPascal;
+    if (PascalOnGDB() && Format == dvfNatural && Suffix.empty() &&
+        FProcess.Requests().Ask(AsPascal, &TGDBCommand::CreateDataEvaluateExpressionCommand, Sent))
+      Created.FValue = AsPascal.FValue;
     {
       std::lock_guard Guard(FLock);
       FEvalVarName = Created.FName;

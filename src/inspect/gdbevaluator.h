@@ -34,7 +34,8 @@ public:
   // on a target other than Windows: GDB's child names hold blanks.
   /// Creates a variable object for Expr in the current frame (Address 0)
   /// with its value and editability. A Pascal program's objects are made
-  /// with the language set to C: GDB dies printing a Pascal array's type.
+  /// and listed with the language set to C: GDB dies printing a Pascal
+  /// array's type.
   void VarCreate(const std::string& Expr, UInt64 Address, TVarCreateResult& Created);
   void VarDelete(const std::string& Name);
   /// Children From to To - 1; From -1 lists them all (LLDB: up to its limit).
@@ -80,6 +81,9 @@ private:
   void Prepare();
   /// Sets the process's evaluating flag for a scope and restores it.
   class TEvaluatingScope;
+  /// Sets GDB's language to C for a scope in a Pascal program.
+  class TCLanguageScope;
+  bool PascalOnGDB();
 
   TGDBProcess& FProcess;
   std::atomic<bool>& FEvaluating;
