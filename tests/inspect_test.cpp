@@ -251,3 +251,44 @@ INSTANTIATE_TEST_SUITE_P(DebugFormats, InspectInPascal, ::testing::Values("pasva
 
 } // namespace
 } // namespace midebug
+
+namespace midebug {
+namespace {
+
+using Strings = std::vector<std::string>;
+
+/// tests/debuggees/values.c under LLDB's real MI front end, where it runs.
+class InspectOnLLDB : public test::ValueSession {
+protected:
+  void SetUp() override {
+    ValueSession::SetUp();
+    std::string WhyNot;
+    const std::string LLDB = test::LLDBMIPath(WhyNot);
+    if (LLDB.empty())
+      GTEST_SKIP() << WhyNot;
+    Process = TGDBProcessManager::CreateProcess(Listener, test::Debuggee("values"), "", "", "local", "Linux64", glC,
+                                                gcAMD64, LLDB);
+    ASSERT_TRUE(Process);
+    ASSERT_TRUE(Core().ProcessAsyncRequest("-break-insert " + At("values.c", "stop here")));
+    Process->Run();
+    ASSERT_NO_FATAL_FAILURE(WaitForStop());
+  }
+  void TearDown() override {
+    Process = nullptr;
+    ProcessPending();
+  }
+};
+
+TEST_F(InspectOnLLDB, ChildrenAreListedInOneBracketUpToLLDBsLimit) {
+  EXPECT_EQ(Eval("number"), "3");
+  const TIntfPtr<IGDBInspect> Area = Thread()->CreateInspector("area", 1);
+  EXPECT_EQ(Members(Area).size(), 2u);
+  EXPECT_EQ(Members(Area->CreateSubInspector(iiVariable, 1))[1], "y=4");
+  const TIntfPtr<IGDBInspect> Small = Thread()->CreateInspector("small", 1);
+  Small->SetInspectRange(8, 20);
+  EXPECT_EQ(Small->GetMemberCount(), 2);
+  EXPECT_EQ(Member(Small, 1), "[9]=9");
+}
+
+} // namespace
+} // namespace midebug
