@@ -85,4 +85,30 @@ bool AwaitStops(const TQuietListener& Listener, int Count) {
   return true;
 }
 
+bool TRawGdb::Start(const std::string& Program, const std::string& Location) {
+  return TRawGdbPipes::Start() && Await("(gdb) \n") && Request("-file-exec-and-symbols \"" + Program + "\"") &&
+         Request("-break-insert -f " + Location) && Request("-exec-run", "*stopped");
+}
+
+bool TRawGdb::Request(const std::string& Command, const std::string& Also) {
+  const std::string Token = std::to_string(++FToken);
+  return Write(Token + Command + "\n") && Await("\n" + Token + "^") && (Also.empty() || Await(Also));
+}
+
+bool TRawGdb::Await(const std::string& Text) {
+  char Buffer[4096];
+  for (;;) {
+    const size_t Found = FPending.find(Text);
+    if (Found != std::string::npos) {
+      // What follows starts a line as far as later searches go.
+      FPending = "\n" + FPending.substr(Found + Text.size());
+      return true;
+    }
+    const Int64 BytesRead = Read(Buffer, sizeof Buffer);
+    if (BytesRead <= 0)
+      return false;
+    FPending.append(Buffer, static_cast<size_t>(BytesRead));
+  }
+}
+
 } // namespace midebug::bench

@@ -54,6 +54,23 @@ private:
   Integer FPid = -1;
 };
 
+/// The baseline's MI session: GDB on two pipes, answered line by line with
+/// blocking reads.
+class TRawGdb : public TRawGdbPipes {
+public:
+  /// Starts GDB, loads Program, breaks at Location and runs to it.
+  bool Start(const std::string& Program, const std::string& Location = "main");
+  /// Sends Command under a fresh token and reads until its result record
+  /// and, when given, Also.
+  bool Request(const std::string& Command, const std::string& Also = {});
+
+private:
+  bool Await(const std::string& Text);
+
+  Cardinal FToken = 0;
+  std::string FPending = "\n";
+};
+
 /// Runs every registered benchmark (honouring the command-line options), then
 /// prints, for each pair, the first's mean real time per iteration divided by
 /// the second's. Returns the process exit code.

@@ -36,48 +36,12 @@ std::string BuildLoopProgram() {
   return std::system(Command.c_str()) == 0 ? Program : std::string();
 }
 
-/// GDB on two pipes, answered line by line with blocking reads.
-class TRawGdb : public bench::TRawGdbPipes {
-public:
-  bool Start(const std::string& Program) {
-    return TRawGdbPipes::Start() && Await("(gdb) \n") &&
-           Request("-file-exec-and-symbols \"" + Program + "\"") && Request("-break-insert -f main") &&
-           Request("-exec-run", "*stopped");
-  }
-  /// Sends Command under a fresh token and reads until its result record
-  /// and, when given, Also.
-  bool Request(const std::string& Command, const std::string& Also = {}) {
-    const std::string Token = std::to_string(++FToken);
-    return Write(Token + Command + "\n") && Await("\n" + Token + "^") && (Also.empty() || Await(Also));
-  }
-
-private:
-  bool Await(const std::string& Text) {
-    char Buffer[4096];
-    for (;;) {
-      const size_t Found = FPending.find(Text);
-      if (Found != std::string::npos) {
-        // What follows starts a line as far as later searches go.
-        FPending.replace(0, Found + Text.size(), "\n");
-        return true;
-      }
-      const Int64 BytesRead = Read(Buffer, sizeof Buffer);
-      if (BytesRead <= 0)
-        return false;
-      FPending.append(Buffer, static_cast<size_t>(BytesRead));
-    }
-  }
-
-  Cardinal FToken = 0;
-  std::string FPending = "\n";
-};
-
 void BM_StepOverVsRawMI(benchmark::State& State) {
   SetMainThread();
   const std::string Program = BuildLoopProgram();
   TIntfPtr<bench::TQuietListener> Listener(new bench::TQuietListener);
   TIntfPtr<IGDBProcess> Process;
-  TRawGdb Raw;
+  bench::TRawGdb Raw;
   try {
     Process = TGDBProcessManager::CreateProcess(Listener, Program, "", "", "local", "Linux64", glC, gcAMD64, "gdb");
   } catch (const ENonAIRException& Error) {
