@@ -75,31 +75,26 @@ bool TRawGdbPipes::Write(const std::string& Line) {
 
 Int64 TRawGdbPipes::Read(char* Buffer, size_t Count) { return ReadHandle(FStdOut.ReadHandle(), Buffer, Count); }
 
-bool AwaitStops(const TQuietListener& Listener, int Count) {
-  const auto Deadline = std::chrono::steady_clock::now() + std::chrono::seconds(30);
-  while (Listener.Stops < Count) {
-    if (std::chrono::steady_clock::now() > Deadline)
-      return false;
-    WaitAndProcess(std::chrono::milliseconds(1));
-  }
-  return true;
+bool TRawGdbPipes::Request(const std::string& Command, const std::string& Also, std::string* Reply) {
+  const std::string Token = std::to_string(++FToken);
+  return Write(Token + Command + "\n") && Await("\n" + Token + "^") && (!Reply || Await("\n", Reply)) &&
+         (Also.empty() || Await(Also));
 }
 
-bool TRawGdb::Start(const std::string& Program, const std::string& Location) {
-  return TRawGdbPipes::Start() && Await("(gdb) \n") && Request("-file-exec-and-symbols \"" + Program + "\"") &&
+bool TRawGdbPipes::StartProgram(const std::string& Program, const std::string& Location) {
+  return Await("(gdb) \n") && Request("-file-exec-and-symbols \"" + Program + "\"") &&
          Request("-break-insert -f " + Location) && Request("-exec-run", "*stopped");
 }
 
-bool TRawGdb::Request(const std::string& Command, const std::string& Also) {
-  const std::string Token = std::to_string(++FToken);
-  return Write(Token + Command + "\n") && Await("\n" + Token + "^") && (Also.empty() || Await(Also));
-}
-
-bool TRawGdb::Await(const std::string& Text) {
+bool TRawGdbPipes::Await(const std::string& Text, std::string* Before) {
   char Buffer[4096];
+  // The line start a search leaves in front is not part of what follows.
+  const size_t From = Before ? 1 : 0;
   for (;;) {
-    const size_t Found = FPending.find(Text);
+    const size_t Found = FPending.find(Text, From);
     if (Found != std::string::npos) {
+      if (Before)
+        *Before = FPending.substr(From, Found - From);
       // What follows starts a line as far as later searches go.
       FPending = "\n" + FPending.substr(Found + Text.size());
       return true;
@@ -109,6 +104,16 @@ bool TRawGdb::Await(const std::string& Text) {
       return false;
     FPending.append(Buffer, static_cast<size_t>(BytesRead));
   }
+}
+
+bool AwaitStops(const TQuietListener& Listener, int Count) {
+  const auto Deadline = std::chrono::steady_clock::now() + std::chrono::seconds(30);
+  while (Listener.Stops < Count) {
+    if (std::chrono::steady_clock::now() > Deadline)
+      return false;
+    WaitAndProcess(std::chrono::milliseconds(1));
+  }
+  return true;
 }
 
 } // namespace midebug::bench

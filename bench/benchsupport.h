@@ -47,28 +47,23 @@ public:
   bool Write(const std::string& Line);
   /// One blocking read into Buffer; the count read, 0 or less at the end.
   Int64 Read(char* Buffer, size_t Count);
-
-private:
-  TPipe FStdIn;
-  TPipe FStdOut;
-  Integer FPid = -1;
-};
-
-/// The baseline's MI session: GDB on two pipes, answered line by line with
-/// blocking reads.
-class TRawGdb : public TRawGdbPipes {
-public:
-  /// Starts GDB, loads Program, breaks at Location and runs to it.
-  bool Start(const std::string& Program, const std::string& Location = "main");
   /// Sends Command under a fresh token and reads until its result record
-  /// and, when given, Also.
-  bool Request(const std::string& Command, const std::string& Also = {});
+  /// and, when given, Also; Reply (when given) receives the result record's
+  /// line after its "^".
+  bool Request(const std::string& Command, const std::string& Also = {}, std::string* Reply = nullptr);
+  /// Loads Program, breaks at Location and runs to it.
+  bool StartProgram(const std::string& Program, const std::string& Location);
 
 private:
-  bool Await(const std::string& Text);
+  /// Reads until Text has arrived; what came before it (after the line
+  /// start the last search left) goes to Before when given.
+  bool Await(const std::string& Text, std::string* Before = nullptr);
 
   Cardinal FToken = 0;
   std::string FPending = "\n";
+  TPipe FStdIn;
+  TPipe FStdOut;
+  Integer FPid = -1;
 };
 
 /// Runs every registered benchmark (honouring the command-line options), then

@@ -62,7 +62,7 @@ public:
     }
     TGDBProcess& Core = *static_cast<TGDBProcess*>(Process.get());
     if (Program.empty() || !Core.ProcessAsyncRequest("-break-insert " + StopAt) ||
-        !Core.ProcessAsyncRequest("-exec-run") || !bench::AwaitStops(*Listener, 1) || !Raw.Start(Program, StopAt)) {
+        !Core.ProcessAsyncRequest("-exec-run") || !bench::AwaitStops(*Listener, 1) || !Raw.Start() || !Raw.StartProgram(Program, StopAt)) {
       State.SkipWithError("cannot reach the locals");
       return false;
     }
@@ -92,7 +92,7 @@ public:
 
   TIntfPtr<bench::TQuietListener> Listener{new bench::TQuietListener};
   TIntfPtr<IGDBProcess> Process;
-  bench::TRawGdb Raw;
+  bench::TRawGdbPipes Raw;
 
 private:
   TClock::duration FLibraryTime{};

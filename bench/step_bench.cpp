@@ -41,7 +41,7 @@ void BM_StepOverVsRawMI(benchmark::State& State) {
   const std::string Program = BuildLoopProgram();
   TIntfPtr<bench::TQuietListener> Listener(new bench::TQuietListener);
   TIntfPtr<IGDBProcess> Process;
-  bench::TRawGdb Raw;
+  bench::TRawGdbPipes Raw;
   try {
     Process = TGDBProcessManager::CreateProcess(Listener, Program, "", "", "local", "Linux64", glC, gcAMD64, "gdb");
   } catch (const ENonAIRException& Error) {
@@ -50,7 +50,7 @@ void BM_StepOverVsRawMI(benchmark::State& State) {
   }
   Process->SetRunToMainBreakpoint();
   Process->Run();
-  if (Program.empty() || !bench::AwaitStops(*Listener, 1) || !Raw.Start(Program)) {
+  if (Program.empty() || !bench::AwaitStops(*Listener, 1) || !Raw.Start() || !Raw.StartProgram(Program, "main")) {
     State.SkipWithError("cannot reach main");
     return;
   }

@@ -37,7 +37,7 @@ std::string LogConsole(const std::string& Data) { return "Log(2," + Data + ")"; 
 
 // --- Scanner ----------------------------------------------------------------
 
-TEST(ParserScanner, CStringUnescapesOnlyQuotes) {
+TEST(ParserScanner, CStringUnescapesQuotesAndHighBytes) {
   struct TCase {
     std::string Input;
     std::string Value;
@@ -50,6 +50,11 @@ TEST(ParserScanner, CStringUnescapesOnlyQuotes) {
       {R"("unterminated)", "", ""},
       {R"("ends in backslash\)", "", ""},
       {"x\"no\"", "", "x\"no\""},
+      // GDB 13 on a program's UTF-8 text: the octal escapes are its bytes; an
+      // escaped backslash before digits is the value's own escape.
+      {R"("h\303\251llo \\377 \342\202\254")", "h\u00e9llo \\\\377 \u20ac", ""},
+      {R"("\"\360\237\230\200\"")", "\"\U0001F600\"", ""},
+      {R"("lone \377 and \303x \033[0m \1234")", "lone \u00ff and \u00c3x \\033[0m \\1234", ""},
   };
   for (const TCase& Case : Cases) {
     TMIScanner Scanner(Case.Input);

@@ -9,6 +9,8 @@
 
 #include <gtest/gtest.h>
 
+#include <csignal>
+#include <cstdio>
 #include <filesystem>
 #include <string>
 
@@ -60,6 +62,14 @@ TEST_F(LLDBOnLinux, WithoutAProfileALinuxTargetTakesNoAndroidRoute) {
   EXPECT_TRUE(Listener->HasCall("Exited(3,)"));
 }
 
+TEST_F(LLDBOnLinux, ALaunchRefusedBeforeAnyProcessEndsAtOnceWithTheReason) {
+  const test::TScopedEnv NoServer("LLDB_DEBUGSERVER_PATH", Scratch.Path() + "/no-lldb-server");
+  Launch("exitthree");
+  Process->Run();
+  ASSERT_TRUE(Listener->PumpUntilCall("Exited("));
+  EXPECT_TRUE(Listener->HasCallContaining("unable to locate lldb-server"));
+}
+
 TEST_F(LLDBOnLinux, EveryThreadOfAPausedProgramIsStopped) {
   Launch("idlers");
   Process->Run();
@@ -73,6 +83,28 @@ TEST_F(LLDBOnLinux, EveryThreadOfAPausedProgramIsStopped) {
   }
   Process->Terminate();
   EXPECT_TRUE(Listener->PumpUntilCall("Exited("));
+}
+
+TEST_F(LLDBOnLinux, TheLocalProfileAttachesWithTheDebuggerNamedAndDetachLeavesTheProgram) {
+  const std::string Start = "exec '" + Debuggee("sleeper") + "' >/dev/null 2>&1 & echo $!";
+  FILE* Shell = popen(Start.c_str(), "r");
+  ASSERT_NE(Shell, nullptr);
+  int Pid = 0;
+  ASSERT_EQ(std::fscanf(Shell, "%d", &Pid), 1);
+  pclose(Shell);
+  Process = TGDBProcessManager::AttachProcess(Listener, Pid, "local", "Linux64", glC, gcAMD64, LLDB);
+  ASSERT_TRUE(Process);
+  ASSERT_TRUE(Listener->PumpUntilCall("Suspended("));
+  EXPECT_EQ(Process->GetPid(), Pid);
+  const TIntfPtr<IGDBThread> Thread = Process->GetThread(Process->GetSuspendedThreadId());
+  ASSERT_TRUE(Thread);
+  EXPECT_GT(Thread->GetCallCount(), 1);
+  Process->Detach();
+  ASSERT_TRUE(Listener->PumpUntilCall("Exited("));
+  Process = nullptr;
+  const bool StillRunning = test::ProcessRuns(Pid);
+  kill(Pid, SIGKILL);
+  EXPECT_TRUE(StillRunning);
 }
 
 } // namespace

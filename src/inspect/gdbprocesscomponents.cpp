@@ -25,8 +25,8 @@ void TGDBProcess::MakeInspectComponents() {
   FBreakpoints.reset(new TGDBBreakpointTable);
   FFiles.reset(new TGDBFileTable);
   FLines.reset(new TGDBLineCache);
-  FMemory.reset(new TGDBMemoryCache);
-  FRegisters.reset(new TGDBRegisterIds);
+  FMemory.reset(new TGDBMemoryCache(*this));
+  FRegisters.reset(new TGDBRegisterIds(*this));
   FEvaluator.reset(new TGDBEvaluator(*this, FEvaluating, FMaxChildrenCount));
 }
 

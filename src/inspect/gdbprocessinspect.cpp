@@ -19,12 +19,5 @@ bool TGDBProcess::SetNewEip(UInt64) { return false; }
 Integer TGDBProcess::GetFileIndex(const std::string&) { return 0; }
 std::string TGDBProcess::GetFileName(Integer) { return {}; }
 bool TGDBProcess::SetFileName(Integer, const std::string&) { return false; }
-Integer TGDBProcess::GetMemory(UInt64, void*, Integer) { return 0; }
-Integer TGDBProcess::SetMemory(UInt64, const void*, Integer) { return 0; }
-TIntfPtr<IGDBDisassemble> TGDBProcess::GetDisassembler() { return nullptr; }
-void TGDBProcess::DisassembleAt(UInt64, Integer& Size, std::string& Text) {
-  Size = 0;
-  Text.clear();
-}
 
 } // namespace midebug

@@ -2,6 +2,7 @@
 
 #include "inspect/gdbevaluator.h"
 #include "inspect/gdbinspect.h"
+#include "inspect/gdbregisterids.h"
 #include "inspect/gdbthreadtable.h"
 #include "process/gdbprocess.h"
 
@@ -159,24 +160,71 @@ TStringArray TGDBThread::GetCallParams(Integer Index) {
 
 Integer TGDBThread::GetFileIndex(const std::string& FileName) { return FProcess->GetFileIndex(FileName); }
 
-// Registers and disassembly come with operations of their own; until then
-// they report failure.
+// --- Registers -----------------------------------------------------------------
+
+bool TGDBThread::AtFrameZero(const std::function<bool()>& Read) {
+  SetAsSuspendedThread();
+  if (!ActsOnThisThread())
+    return false;
+  // Registers are read in the innermost frame; the frame the IDE selected is
+  // selected again afterwards.
+  const Integer Frame = FFrameIndex;
+  if (Frame != 0)
+    FProcess->Threads().SelectFrame(0);
+  const bool Done = Read();
+  if (Frame != 0)
+    FProcess->Threads().SelectFrame(Frame);
+  return Done;
+}
+
+bool TGDBThread::Writable() {
+  SetAsSuspendedThread();
+  return !ZombieState() && FProcess->GetSuspendedThreadId() == FId;
+}
+
+void TGDBThread::Relocate() {
+  // The debugger reports no new location for a written pc or stack pointer,
+  // and GDB 13 even answers with its frames from before the write until a
+  // thread is selected: selecting this one again fetches the new location.
+  FCallCount = -1;
+  FCallWindows.clear();
+  const Integer Frame = FFrameIndex;
+  FProcess->Threads().Select(FId);
+  if (Frame != 0)
+    FProcess->Threads().SelectFrame(Frame);
+}
+
 bool TGDBThread::GetRegisters(TUInt64Array& Values, UInt64& PC) {
-  Values.clear();
+  const bool Read = AtFrameZero([&] { return FProcess->Registers().GetRegisters(Values); });
   PC = FLocation.Address;
-  return false;
+  return Read;
 }
-bool TGDBThread::SetRegisters(const TUInt64Array&, const TUInt64Array&) { return false; }
+
+bool TGDBThread::SetRegisters(const TUInt64Array& Old, const TUInt64Array& New) {
+  if (!Writable())
+    return false;
+  const bool Written = FProcess->Registers().SetRegisters(Old, New);
+  if (Old != New)
+    Relocate();
+  return Written;
+}
+
 bool TGDBThread::GetFPURegisters(TFPURegValueArray& Values) {
-  Values.clear();
-  return false;
+  return AtFrameZero([&] { return FProcess->Registers().GetFPURegisters(Values); });
 }
-bool TGDBThread::SetFPURegisters(const TFPURegValueArray&, const TFPURegValueArray&) { return false; }
+
+bool TGDBThread::SetFPURegisters(const TFPURegValueArray& Old, const TFPURegValueArray& New) {
+  return Writable() && FProcess->Registers().SetFPURegisters(Old, New);
+}
+
 bool TGDBThread::GetXMMRegisters(TXMMRegValueArray& Values) {
-  Values.clear();
-  return false;
+  return AtFrameZero([&] { return FProcess->Registers().GetXMMRegisters(Values); });
 }
-bool TGDBThread::SetXMMRegisters(const TXMMRegValueArray&, const TXMMRegValueArray&) { return false; }
+
+bool TGDBThread::SetXMMRegisters(const TXMMRegValueArray& Old, const TXMMRegValueArray& New) {
+  return Writable() && FProcess->Registers().SetXMMRegisters(Old, New);
+}
+
 bool TGDBThread::SetRunToMainBreakpoint(bool& NoEntryStop) {
   if (!FProcess->Kernel().SupportStopOnEntryPoint()) {
     NoEntryStop = true;
@@ -216,7 +264,7 @@ TGDBRetCode TGDBThread::Modify(const std::string& NewValue, std::string& Value) 
   return FProcess->Evaluator().Modify(NewValue, Value);
 }
 
-TIntfPtr<IGDBDisassemble> TGDBThread::GetDisassembler() { return nullptr; }
+TIntfPtr<IGDBDisassemble> TGDBThread::GetDisassembler() { return FProcess->GetDisassembler(); }
 TIntfPtr<IGDBInspect> TGDBThread::CreateLocalVarsInspector(Integer Frame) {
   if (!FProcess->Suspended() || !FProcess->Alive())
     return new TGDBLocalInspect(*FProcess, nullptr, Frame, 0, 0, 0);

@@ -5,6 +5,7 @@
 #include "mi/gdbcommand.h"
 #include "process/gdbinterfaces.h"
 
+#include <functional>
 #include <map>
 #include <mutex>
 #include <string>
@@ -122,6 +123,13 @@ private:
   const TGDBStackFrame* CallFrame(Integer Index);
   /// True for the entry past the frames counted on a stack cut short.
   bool IsCutMarker(Integer Index) const;
+  /// Runs Read with this thread current at its innermost frame; false when
+  /// the debugger acts on another thread.
+  bool AtFrameZero(const std::function<bool()>& Read);
+  /// Makes this thread current; true when it is and can be written to.
+  bool Writable();
+  /// Fetches the location and stack again after a register write.
+  void Relocate();
 };
 
 } // namespace midebug

@@ -627,6 +627,19 @@ std::string TGDBCommand::CreateDataWriteMemoryBytesCommand(std::string& Token, U
   return MiLine(Token, ctCLMemoryWrite, " " + Hex(Address) + " -s 1" + Bytes);
 }
 
+std::string TGDBCommand::CreateGDBDataWriteMemoryBytesCommand(std::string& Token, UInt64 Address,
+                                                              const Byte* Data, Integer Count) {
+  std::string Bytes;
+  for (Integer Index = 0; Data != nullptr && Index < Count; ++Index)
+    Bytes += UpperHex(Data[Index], 2);
+  return MiLine(Token, ctDataWriteMemoryBytes, " " + Hex(Address) + " " + Bytes);
+}
+
+std::string TGDBCommand::CreateGDBDataWriteRegisterValues(std::string& Token, TMiCommand Command, Integer Number,
+                                                          UInt64 Value) {
+  return MiLine(Token, Command, " x " + std::to_string(Number) + " 0x" + UpperHex(Value, 1));
+}
+
 std::string TGDBCommand::CreateDataInfoLineCommand(std::string& Token, const std::string& File, Integer Line) {
   return MiLine(Token, ctDataInfoLine, " " + File + ":" + std::to_string(Line));
 }

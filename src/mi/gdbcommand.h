@@ -272,6 +272,14 @@ public:
   /// an MI token, which is its wait key.
   std::string CreateDataWriteMemoryBytesCommand(std::string& Token, UInt64 Address, const Byte* Data,
                                                 Integer Count);
+  /// GDB's "-data-write-memory-bytes" of Count bytes as one hexadecimal
+  /// string (GDB has no "memory write").
+  std::string CreateGDBDataWriteMemoryBytesCommand(std::string& Token, UInt64 Address, const Byte* Data,
+                                                   Integer Count);
+  /// GDB's "-data-write-register-values" of the register the debugger
+  /// numbers Number; Command tells which register set it belongs to.
+  std::string CreateGDBDataWriteRegisterValues(std::string& Token, TMiCommand Command, Integer Number,
+                                               UInt64 Value);
   std::string CreateDataInfoLineCommand(std::string& Token, const std::string& File, Integer Line);
   std::string CreateDataInfoLineCommand(std::string& Token, UInt64 Address);
   /// Start -1 lists every line of the file.

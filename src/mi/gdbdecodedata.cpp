@@ -383,9 +383,16 @@ bool DecodeDataReadMemoryBytes(TDataReadMemoryResult& Memory, TMIScanner& Scanne
   if (!FindResult(Scanner, "memory", Blocks))
     return false;
   TMIScanner::TNestedScan InBlocks(Scanner, Blocks);
+  TMIScanner::TNestedScan InFirst(Scanner, Scanner.ReadValue());
   std::string_view Contents;
   if (!FindResult(Scanner, "contents", Contents))
     return false;
+  // GDB skips what it cannot read: a first block that starts later than the
+  // address asked for means nothing could be read there.
+  if (Scanner.FindUInt64("offset", 0) != 0) {
+    Memory.FData.clear();
+    return true;
+  }
   TDataByteArray Bytes(Contents.size() / 2);
   for (size_t Index = 0; Index < Bytes.size(); ++Index) {
     const int High = HexDigitValue(Contents[2 * Index]);

@@ -4,6 +4,7 @@
 #include "platform/hexdigits.h"
 
 #include <array>
+#include <utility>
 
 namespace midebug {
 
@@ -198,11 +199,16 @@ bool TGDBOutputParser::ProcessResultRecord() {
   // may later add ^error) finds nobody waiting.
   TGDBResult* WaitObject = FToken.empty() ? nullptr : FProcess.RemoveWaitObject(FToken);
 
+  const std::string CLIError = std::exchange(FCLIError, std::string());
   if (Class == "done") {
     if (FScanner.Char() == ',' && !FScanner.AtEnd()) {
       FScanner.NextChar();
       if (WaitObject)
         WaitObject->FError = !DecodeResult(*WaitObject, FScanner, FIsLLDB);
+    } else if (WaitObject && !CLIError.empty() &&
+               (WaitObject->FCommand == ctCLRegisterWrite || WaitObject->FCommand == ctCLMemoryWrite)) {
+      WaitObject->FError = true;
+      WaitObject->SetErrorMessage(CLIError);
     }
   } else if (Class == "running") {
     FProcess.NotifyProcessResumed();
@@ -473,9 +479,9 @@ bool TGDBOutputParser::ProcessNotifyRecord() {
     }
   } else if (Class == "shlib-state-modified" || Class == "dyld-load-address-was-resolved" ||
              Class == "breakpoint-created" || Class == "thread-group-added" || Class == "thread-group-exited" ||
-             Class == "cmd-param-changed") {
+             Class == "cmd-param-changed" || Class == "memory-changed") {
     // Nothing the process tracks; a changed setting is the echo of one the
-    // process made itself ("set args").
+    // process made itself ("set args"), changed memory the echo of a write.
   } else {
     const std::string Rest(FScanner.ReadRestOfLine(FEndOfLineMarker));
     if (Rest == "\n" || (FIsLLDB && Rest.starts_with("==")))
@@ -608,6 +614,8 @@ bool TGDBOutputParser::ProcessLogStream() {
   if (!WaitObject) {
     if (FProcess.IsWindows() && FProcess.IsAttachMode() && Text.find(AttachFailed) != std::string::npos)
       FProcess.NotifyProcessExited(-1, "");
+    if (FIsLLDB && Text.starts_with("error: "))
+      FCLIError = std::string(StripTrailingEscapes(Text));
     return false;
   }
   if (WaitObject->FCommand == ctCLKill) {

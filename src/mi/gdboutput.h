@@ -82,6 +82,9 @@ private:
   const std::string FEndOfLineMarker;
   const bool FIsLLDB;
   std::string FToken;
+  /// LLDB reports a failed CLI write as an "error: " log line before a plain
+  /// done record: the last such line of the block, for the record after it.
+  std::string FCLIError;
 
   // Scratch records shared by the records of one block.
   TGDBLocation FLocation;

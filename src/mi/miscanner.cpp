@@ -1,5 +1,7 @@
 #include "mi/miscanner.h"
 
+#include "platform/textencoding.h"
+
 #include <cstring>
 #include <limits>
 
@@ -10,6 +12,24 @@ namespace {
 bool IsDigit(char C) { return C >= '0' && C <= '9'; }
 bool IsLetter(char C) { return (C >= 'a' && C <= 'z') || (C >= 'A' && C <= 'Z'); }
 bool IsBlank(char C) { return C == ' ' || C == '\t'; }
+bool IsOctal(char C) { return C >= '0' && C <= '7'; }
+
+/// The byte of the three octal digits that start Text when it lies above
+/// 0x7f (debuggers escape such bytes of a c-string so), else -1.
+int HighOctalByte(std::string_view Text) {
+  if (Text.size() < 3 || (Text[0] != '2' && Text[0] != '3') || !IsOctal(Text[1]) || !IsOctal(Text[2]))
+    return -1;
+  return (Text[0] - '0') * 64 + (Text[1] - '0') * 8 + (Text[2] - '0');
+}
+
+/// True when Raw holds a real (not backslash-escaped) high octal escape.
+bool HasHighOctalEscape(std::string_view Raw) {
+  for (size_t I = Raw.find('\\'); I != std::string_view::npos; I = Raw.find('\\', I + 2)) {
+    if (HighOctalByte(Raw.substr(I + 1)) >= 0)
+      return true;
+  }
+  return false;
+}
 
 /// The sign and magnitude of a number text, or false when the text is not a
 /// number. Hexadecimal magnitudes may use all of MaxHexDigits digits; decimal
@@ -292,18 +312,35 @@ std::string_view TMIScanner::ScanCString(bool Keep) {
   }
   FPos = I + 1;
   const std::string_view Raw = FText.substr(Start, I - Start);
-  if (!EscapedQuote || !Keep)
+  if (!Keep || (!EscapedQuote && !HasHighOctalEscape(Raw)))
     return Raw;
+  // Escapes come in pairs: a backslash-quote becomes a quote and an octal
+  // escape of a byte above 0x7f becomes that byte (runs of them decoded as
+  // UTF-8, with the ANSI fallback for the bytes that are not); every other
+  // escape, a doubled backslash included, stays as written.
   std::string& Unescaped = FOwned.emplace_back();
   Unescaped.reserve(Raw.size());
+  std::string Bytes;
   for (size_t J = 0; J < Raw.size(); ++J) {
-    if (Raw[J] == '\\' && J + 1 < Raw.size() && Raw[J + 1] == '"') {
-      Unescaped += '"';
-      ++J;
+    int Byte = Raw[J] == '\\' ? HighOctalByte(Raw.substr(J + 1)) : -1;
+    if (Byte >= 0) {
+      Bytes += static_cast<char>(Byte);
+      J += 3;
+      continue;
+    }
+    if (!Bytes.empty()) {
+      Unescaped += DecodeUTF8OrAnsi(Bytes);
+      Bytes.clear();
+    }
+    if (Raw[J] == '\\' && J + 1 < Raw.size()) {
+      if (Raw[J + 1] != '"')
+        Unescaped += '\\';
+      Unescaped += Raw[++J];
     } else {
       Unescaped += Raw[J];
     }
   }
+  Unescaped += DecodeUTF8OrAnsi(Bytes);
   return Unescaped;
 }
 

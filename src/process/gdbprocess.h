@@ -136,6 +136,7 @@ public:
   TGDBModule GetModule(Integer Id) override { return FModules.Current(Id); }
   bool CanSetRunToMainBreakpoint() const { return FBreakOnMain != nullptr; } ///< run-to-main breakpoint placed
   TGDBThreadTable& Threads() { return *FThreads; }
+  TGDBRegisterIds& Registers() { return *FRegisters; }
   TGDBEvaluator& Evaluator() { return *FEvaluator; }
   TGDBKernel& Kernel() { return *FKernel; }
   TGDBCPU CPU() const { return FRequests.CPU(); }
@@ -204,9 +205,8 @@ private:
   TIntfPtr<IGDBBreakpointListener> FBreakOnMain;
   TGDBConsoleQuery FLanguageQuery{"show language", "The current source language is \"", '"'}; ///< GDB 13's words
   TProgramTerminal FTerminal;
-
   TLiveProcessKey FLiveKey;
-  std::thread FOutputThread;
+  std::thread FOutputThread; ///< the only reader of the debugger
   std::string FLaunchErrorMessage;
   std::atomic<Integer> FMaxChildrenCount{-1}, FPid{-1}, FLastSuspendedThreadId{-1};
   std::atomic<UInt64> FBaseAddress{0};

@@ -60,7 +60,14 @@ TIntfPtr<IGDBProcess> TGDBProcessManager::AttachProcess(const TIntfPtr<IGDBProce
 TIntfPtr<IGDBProcess> TGDBProcessManager::AttachProcess(const TIntfPtr<IGDBProcessListener>& Listener, Integer Pid,
                                                         const std::string& RemoteProfile, const std::string& Platform,
                                                         TGDBLanguage Language, TGDBCPU CPU) {
-  return Launch(Listener, RemoteProfile, "", Pid, "", Language, CPU, Platform, [&](TGDBProcess& Process) {
+  return AttachProcess(Listener, Pid, RemoteProfile, Platform, Language, CPU, "");
+}
+
+TIntfPtr<IGDBProcess> TGDBProcessManager::AttachProcess(const TIntfPtr<IGDBProcessListener>& Listener, Integer Pid,
+                                                        const std::string& RemoteProfile, const std::string& Platform,
+                                                        TGDBLanguage Language, TGDBCPU CPU,
+                                                        const std::string& LauncherPath) {
+  return Launch(Listener, RemoteProfile, LauncherPath, Pid, "", Language, CPU, Platform, [&](TGDBProcess& Process) {
     return Process.AttachProcess(AttachesByItself(Platform) ? -1 : Pid);
   });
 }

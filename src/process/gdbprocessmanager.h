@@ -34,6 +34,11 @@ public:
   static TIntfPtr<IGDBProcess> AttachProcess(const TIntfPtr<IGDBProcessListener>& Listener, Integer Pid,
                                              const std::string& RemoteProfile, const std::string& Platform,
                                              TGDBLanguage Language, TGDBCPU CPU);
+  /// As above, with the debugger LauncherPath (empty: the profile's own), so
+  /// that the "local" profile attaches with LLDB's front end too.
+  static TIntfPtr<IGDBProcess> AttachProcess(const TIntfPtr<IGDBProcessListener>& Listener, Integer Pid,
+                                             const std::string& RemoteProfile, const std::string& Platform,
+                                             TGDBLanguage Language, TGDBCPU CPU, const std::string& LauncherPath);
 };
 
 } // namespace midebug

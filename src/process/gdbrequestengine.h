@@ -71,6 +71,8 @@ public:
     return std::invoke(std::forward<TCreate>(Create), FCommand, Token, std::forward<TArgs>(Args)...);
   }
   TGDBCPU CPU() const { return FCommand.FCPUType; }
+  /// The target platform name ("Win64", "Linux64", ...).
+  const std::string& Platform() const { return FPlatform; }
   /// Builds a command and writes it without waiting; true when written.
   template <class TCreate, class... TArgs>
   bool Fire(TCreate&& Create, TArgs&&... Args) {
