@@ -93,6 +93,14 @@ const std::vector<TCliSession::TCommandEntry>& TCliSession::Commands() {
       {"kill", &TCliSession::CmdKill, "kill", "end the program"},
       {"detach", &TCliSession::CmdDetach, "detach", "let the program go on without the debugger"},
       {"quit", &TCliSession::CmdQuit, "quit", "end the session (a launched program is killed, an attached one detached)"},
+      {"print", &TCliSession::CmdPrint, "print[/x|/d|/c] EXPRESSION", "the value of an expression"},
+      {"print/x", &TCliSession::CmdPrint, "print/x EXPRESSION", "the value in hexadecimal"},
+      {"print/d", &TCliSession::CmdPrint, "print/d EXPRESSION", "the value in decimal"},
+      {"print/c", &TCliSession::CmdPrint, "print/c EXPRESSION", "the value as a character"},
+      {"set", &TCliSession::CmdSetVar, "set var EXPRESSION = VALUE", "assign a value to a variable"},
+      {"info", &TCliSession::CmdInfoValues, "info locals|args", "the current frame's locals or arguments"},
+      {"inspect", &TCliSession::CmdInspect, "inspect EXPRESSION [FROM COUNT]", "a value's children, one level"},
+      {"display", &TCliSession::CmdDisplay, "display EXPRESSION", "print an expression at every stop"},
       {"help", &TCliSession::CmdHelp, "help", "this list"},
   };
   return Table;

@@ -100,6 +100,21 @@ private:
   void CmdQuit(const std::string& Name, const std::vector<std::string>& Arguments);
   void CmdHelp(const std::string& Name, const std::vector<std::string>& Arguments);
 
+  // --- Values (evaluatecommands.cpp) -------------------------------------
+  void CmdPrint(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdSetVar(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdInfoValues(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdInspect(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdDisplay(const std::string& Name, const std::vector<std::string>& Arguments);
+  /// Prints the displayed expressions at a stop, marking those that changed.
+  void ShowDisplays();
+  struct TDisplay {
+    std::string Expr;
+    std::string Value;
+  };
+  std::vector<TDisplay> FDisplays;
+  // --- end of values ------------------------------------------------------
+
   /// True when the program can be resumed or stepped; otherwise prints why.
   bool RequireStopped(const std::string& Name);
   /// The thread commands act on, or null with the reason printed.
