@@ -110,7 +110,8 @@ void TGDBInspect::FillPlaceholders(const std::string& Error) {
   }
 }
 
-bool TGDBInspect::StoreChildren(const TGDBVarChildArray& Children, Integer First) {
+bool TGDBInspect::StoreChildren(const TGDBVarChildArray& Children, Integer First,
+                                const std::shared_ptr<TVarObject>& Owner) {
   for (size_t Index = 0; Index < Children.size(); ++Index) {
     const Integer Slot = First + static_cast<Integer>(Index);
     if (Slot >= FNumChildren)
@@ -120,7 +121,9 @@ bool TGDBInspect::StoreChildren(const TGDBVarChildArray& Children, Integer First
     Child->FType = Record.VarType;
     Child->FAutoDelete = true;
     Child->FDynamic = Record.Dynamic;
-    Child->FVarObject = FVarObject;
+    Child->FVarObject = Owner ? Owner : FVarObject;
+    if (Owner)
+      Child->FExpr = std::to_string(Slot);
     // A child's own pretty printer is asked for its children when opened.
     if (Record.Dynamic && Record.NumChild == 0)
       Child->SetNumChildren(1);
@@ -157,10 +160,17 @@ void TGDBInspect::ListChildren(Integer Index) {
   const auto Next = FChildren.upper_bound(Index);
   if (Next != FChildren.end() && Next->first < End)
     End = Next->first;
-  const bool Ok = Evaluator().VarListChildren(FName, Index, End, Listed);
-  if (Ok && StoreChildren(Listed.FChildren, Index))
-    return;
-  const std::string Error = Ok ? std::string(InvalidInspector) : Listed.FErrorMessage;
+  std::string Error;
+  const bool Large = FNumChildren > TGDBEvaluator::ChildWindow && !FType.empty() && FType.back() == ']';
+  if (Large) {
+    if (ListSlice(Index, End, Error))
+      return;
+  } else {
+    const bool Ok = Evaluator().VarListChildren(FName, Index, End, Listed);
+    if (Ok && StoreChildren(Listed.FChildren, Index))
+      return;
+    Error = Ok ? std::string(InvalidInspector) : Listed.FErrorMessage;
+  }
   for (Integer Slot = Index; Slot < End; ++Slot) {
     TIntfPtr<TGDBInspect>& Child = FChildren[Slot];
     if (Child)
@@ -171,6 +181,27 @@ void TGDBInspect::ListChildren(Integer Index) {
     Child->FAutoDelete = false;
     Child->FLastError = Error;
   }
+}
+
+bool TGDBInspect::ListSlice(Integer From, Integer To, std::string& Error) {
+  TVarCreateResult Slice;
+  Evaluator().VarCreate("(" + GetFullExpr() + ")[" + std::to_string(From) + "]@" + std::to_string(To - From), 0,
+                        Slice);
+  if (Slice.FError) {
+    Error = Slice.FErrorMessage;
+    return false;
+  }
+  const auto Owner = std::make_shared<TVarObject>(Evaluator(), FProcessRef, Slice.FName);
+  TVarListChildrenResult Listed;
+  if (!Evaluator().VarListChildren(Slice.FName, -1, -1, Listed)) {
+    Error = Listed.FErrorMessage;
+    return false;
+  }
+  FSlices.push_back(Owner);
+  if (StoreChildren(Listed.FChildren, From, Owner))
+    return true;
+  Error = InvalidInspector;
+  return false;
 }
 
 void TGDBInspect::ListDynamicChildren() {
@@ -374,6 +405,14 @@ bool TGDBInspect::Update() {
       continue;
     if (TGDBInspect* Changed = ThreadOf(FThread).GetInspect(Change.Name))
       Changed->SetValue(Change.Value);
+  }
+  for (const std::shared_ptr<TVarObject>& Slice : FSlices) {
+    TVarUpdateResult SliceChanges;
+    if (!Evaluator().VarUpdate(Slice->FName, SliceChanges))
+      continue;
+    for (const TNameValue& Change : SliceChanges.FChangeList)
+      if (TGDBInspect* Changed = FThread ? ThreadOf(FThread).GetInspect(Change.Name) : nullptr)
+        Changed->SetValue(Change.Value);
   }
   if (!FProcess.IsLLDB())
     return true;

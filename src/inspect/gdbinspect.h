@@ -8,6 +8,7 @@
 #include <map>
 #include <memory>
 #include <string>
+#include <vector>
 
 namespace midebug {
 
@@ -58,6 +59,9 @@ public:
   const std::string& Name() const { return FName; }
 
 protected:
+  /// A variable object, deleted with the last inspector that shares it.
+  struct TVarObject;
+
   void SetName(const std::string& Name, bool Register);
   void SetNumChildren(Integer Count);
   void FetchValueAndAttribute();
@@ -73,7 +77,13 @@ protected:
   /// Counts a pretty printer's children by listing them in windows.
   void ListDynamicChildren();
   /// Stores listed children from slot First on; false when a name is taken.
-  bool StoreChildren(const TGDBVarChildArray& Children, Integer First);
+  /// Children of a slice (Owner given) are named by their index in this array.
+  bool StoreChildren(const TGDBVarChildArray& Children, Integer First,
+                     const std::shared_ptr<TVarObject>& Owner = nullptr);
+  /// Lists the elements From to To - 1 of a large array through a variable
+  /// object of that slice alone: GDB makes a variable object for every element
+  /// of an array whose children are listed, however few are asked for.
+  bool ListSlice(Integer From, Integer To, std::string& Error);
   TGDBEvaluator& Evaluator();
 
   TGDBProcess& FProcess;
@@ -83,8 +93,9 @@ protected:
   TIntfPtr<IGDBThread> FThread;
   /// The root's variable object, deleted when the root and every child
   /// handed out are gone: GDB deletes the children with it.
-  struct TVarObject;
   std::shared_ptr<TVarObject> FVarObject;
+  /// The slices a large array's windows were listed through, updated with it.
+  std::vector<std::shared_ptr<TVarObject>> FSlices;
   std::string FExpr;
   std::string FFullExpr;
   bool FFullExprDefined = false;
