@@ -73,7 +73,7 @@ public:
   static constexpr Integer ChildWindow = 100;
   /// A pretty printer's children are counted up to this many: an
   /// uninitialised container may claim billions.
-  static constexpr Integer MaxDynamicChildren = 10000;
+  static constexpr Integer MaxDynamicChildren = 1000;
 
 private:
   bool Quoted();

@@ -54,6 +54,7 @@ int touch(int number, double scale, char mark, struct point *where) {
   both.whole = 0x41424344;
   printf("touch %d %g %c %d %d\n", number, scale, mark, where->x, area.topleft.x); /* stop here */
   pt.x = 50;
+  big[99999] = -1;
   printf("after %d %g %c %d %s %d %d\n", number, scale, mark, where->x, pt.name, pt.x, list->value);
   return number + pt.x + both.bytes[0];
 }
