@@ -25,7 +25,8 @@ std::vector<json> RunValues(const std::string& Commands) {
   const std::string Output = Scratch.Path() + "/stdout.txt";
   const std::string Command = std::string("'") + MIDEBUG_CLI + "' --batch --json --wait 20 '" +
                               test::Debuggee("clivalues") + "' < '" + Input + "' > '" + Output + "' 2>/dev/null";
-  EXPECT_EQ(std::system(Command.c_str()), 0);
+  // A batch with a failed command ends with a failure code: the answers tell.
+  (void)std::system(Command.c_str());
   std::vector<json> Lines;
   std::ifstream Stream(Output);
   for (std::string Line; std::getline(Stream, Line);)

@@ -106,8 +106,9 @@ std::string FileName(const json& Object) {
 
 TEST_F(CliTest, CliCommandsThatCannotRunSayWhyAndTheSessionGoesOn) {
   const std::string Program = Debuggee("exitthree");
-  const TCliRun Run = RunCli(Quote(Program), "frobnicate now\nnext\nbt\nthread x\n");
-  EXPECT_EQ(Run.ExitCode, 0);
+  const TCliRun Run = RunCli(Quote(Program), "frobnicate now\nnext\nbt\nthread x\nkill now\n");
+  // A batch run in which a command failed says so in its exit status.
+  EXPECT_EQ(Run.ExitCode, 3);
   const json* Unknown = Run.Answer("frobnicate");
   ASSERT_NE(Unknown, nullptr) << Run.Stdout;
   EXPECT_NE((*Unknown)["error"].get<std::string>().find("unknown command 'frobnicate'"), std::string::npos);
@@ -119,6 +120,9 @@ TEST_F(CliTest, CliCommandsThatCannotRunSayWhyAndTheSessionGoesOn) {
   const json* Thread = Run.Answer("thread");
   ASSERT_NE(Thread, nullptr);
   EXPECT_EQ((*Thread)["error"], "usage: thread N");
+  const json* Kill = Run.Answer("kill");
+  ASSERT_NE(Kill, nullptr);
+  EXPECT_EQ((*Kill)["error"], "'kill' takes no arguments");
 }
 
 // --- Attaching -----------------------------------------------------------------

@@ -277,12 +277,12 @@ TEST(ParserStreams, ConsoleAndTargetText) {
     TCalls Calls;
   } Cases[] = {
       {R"(~"7\tstatic inline int twice(int v) { return v * 2; }\n")",
-       {LogConsole("7   static inline int twice(int v) { return v * 2; } ")}},
+       {LogConsole("7   static inline int twice(int v) { return v * 2; }\n")}},
       {R"(~"Current language:  auto; currently c\n")",
-       {LogConsole("Current language:  auto; currently c "), "Language(c)"}},
-      {R"(~"C:\\new\n")", {LogConsole(R"(C:\\new )")}},
+       {LogConsole("Current language:  auto; currently c\n"), "Language(c)"}},
+      {R"(~"C:\\new\n")", {LogConsole("C:\\\\new\n")}},
       {R"(~"")", {}},
-      {R"(~"ODS: hello\n")", {LogConsole("ODS: hello ")}},
+      {R"(~"ODS: hello\n")", {LogConsole("ODS: hello\n")}},
       {R"(@"abc\r\n")", {LogConsole("abc")}},
       {R"(@"\n")", {LogConsole(R"(\n)")}},
   };

@@ -67,7 +67,8 @@ std::string DecodeLLDBProgramOutput(std::string_view Text) {
   return ReplaceAll(std::move(Bytes), "\r\n", "\n");
 }
 
-/// Console text with the escapes \n as one blank and \t as three blanks. An
+/// Console text with the escape \n as a line break (GDB writes its console
+/// lines in pieces; a reader joins them at the breaks) and \t as three blanks. An
 /// escaped backslash is kept as written and does not start an escape, so a
 /// path such as "C:\\new" is not broken.
 std::string FlattenConsoleEscapes(std::string_view Text) {
@@ -80,7 +81,7 @@ std::string FlattenConsoleEscapes(std::string_view Text) {
     }
     const char Escaped = Text[++I];
     if (Escaped == 'n')
-      Flat += ' ';
+      Flat += '\n';
     else if (Escaped == 't')
       Flat += "   ";
     else {
@@ -89,6 +90,12 @@ std::string FlattenConsoleEscapes(std::string_view Text) {
     }
   }
   return Flat;
+}
+
+/// The text from From to the first line break, without blanks around it.
+std::string_view FirstLineTrimmed(std::string_view Text, size_t From) {
+  const std::string_view Rest = Text.substr(From);
+  return TrimBlanks(Rest.substr(0, Rest.find('\n')));
 }
 
 /// Drops one trailing \n and then one trailing \r escape of a target-stream
@@ -579,13 +586,13 @@ bool TGDBOutputParser::ProcessConsoleStream() {
   }
   const std::string Text = FlattenConsoleEscapes(Raw);
   if (FIsLLDB && Text.starts_with(LLDBMaxChildrenSetting)) {
-    const std::string_view Count = TrimBlanks(std::string_view(Text).substr(LLDBMaxChildrenSetting.size()));
+    const std::string_view Count = FirstLineTrimmed(Text, LLDBMaxChildrenSetting.size());
     FProcess.NotifySettingMaxChildrenCountChanged(MIStrToIntDef(Count, -1));
     return false;
   }
   Log(etConsole, Text);
   if (Text.starts_with(LanguageAnnouncement))
-    FProcess.NotifyLanguageChanged(std::string(TrimBlanks(std::string_view(Text).substr(LanguageAnnouncement.size()))));
+    FProcess.NotifyLanguageChanged(std::string(FirstLineTrimmed(Text, LanguageAnnouncement.size())));
   return false;
 }
 

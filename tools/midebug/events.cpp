@@ -2,6 +2,8 @@
 
 #include "session.h"
 
+#include <regex>
+
 namespace midebug::cli {
 
 // --- The listener --------------------------------------------------------------
@@ -113,28 +115,74 @@ std::string LogKindWord(TGDBEvent Event) {
   }
 }
 
+/// GDB's own notes on threads, stops and the program's end, which the
+/// session reports in its own words: its banner-free console, as a person
+/// reads it.
+bool IsDebuggerChatter(const std::string& Line) {
+  static const char* const Prefixes[] = {
+      "[New Thread ", "[Thread ", "[New LWP ", "[LWP ", "[Inferior ", "[Switching to ", "[Thread debugging using ",
+      "Using host libthread_db", "Program received signal ", "Program terminated with signal ",
+      "The program no longer exists.", "Run till exit from ", "Continuing.", "Starting program: ", "Breakpoint ",
+      "Temporary breakpoint ", "Thread "};
+  for (const char* Prefix : Prefixes)
+    if (Line.starts_with(Prefix))
+      return true;
+  // The frame and source line GDB shows at a stop: "0x... in f () at f.c:8",
+  // "f (a=1) at f.c:8", "8       text".
+  static const std::regex StopEcho(R"(^((0x[0-9a-f]+ in )?\S+ \(.*\)( at \S+:[0-9]+| from \S+)?|[0-9]+(\t|   ).*)$)");
+  return Line.empty() || std::regex_match(Line, StopEcho);
+}
+
+std::string SignalWords(const std::string& Name, const std::string& Description) {
+  const std::string Words = Description.empty() ? SignalDescription(Name) : Description;
+  return Words.empty() ? Name : Name + " (" + Words + ")";
+}
+
+/// A signal's name is a single word in capitals; the library reports other
+/// texts (the debugger's loss, a refused launch) in the same place.
+bool IsSignalName(const std::string& Text) {
+  return Text.size() > 3 && Text.starts_with("SIG") &&
+         Text.find_first_not_of("ABCDEFGHIJKLMNOPQRSTUVWXYZ0123456789") == std::string::npos;
+}
+
 } // namespace
 
 void TCliSession::OnSuspended(Integer ThreadId) {
   FState = TRunState::Stopped;
+  FQuietConsole = false;
   ++FStopCount;
   FCurrentThread = ThreadId;
   FCurrentFrame = 0;
   FThreads.insert(ThreadId);
   TThreadStopReason Reason = tsrUnknown;
   TGDBLocation Location;
+  std::string Header;
   if (FProcess) {
     if (TIntfPtr<IGDBThread> Thread = FProcess->GetThread(ThreadId)) {
       Reason = Thread->GetStopReason();
       Location = Thread->GetCurrentLocation();
+      if (Thread->GetCallCount() > 0)
+        Header = Thread->GetCallHeader(1);
     }
     if (Location.Source.empty() && Location.Address == 0)
       Location = FProcess->GetSuspendedLocation();
   }
-  nlohmann::json Event = {{"event", "stopped"}, {"thread", ThreadId}, {"reason", StopReasonWord(Reason)}};
+  std::string ReasonWord = StopReasonWord(Reason);
+  std::string Why = "Stopped (" + ReasonWord + ")";
+  nlohmann::json Event = {{"event", "stopped"}, {"thread", ThreadId}};
+  if (FPausing) {
+    ReasonWord = "paused";
+    Why = "Paused";
+  } else if (Reason == tsrSignal && !FLastSignal.Name.empty()) {
+    Event["signal"] = FLastSignal.Name;
+    Why = "Stopped by signal " + SignalWords(FLastSignal.Name, FLastSignal.Desc);
+  }
+  FPausing = false;
+  FLastSignal = {};
+  Event["reason"] = ReasonWord;
   Event.update(LocationJson(Location));
-  std::string Text = "Stopped (" + StopReasonWord(Reason) + ") in thread " + std::to_string(ThreadId) + " at " +
-                     LocationText(Location);
+  std::string Text = Why + " in thread " + std::to_string(ThreadId) + ": " +
+                     (Header.empty() ? LocationText(Location) : FrameText(-1, Header, Location));
   const std::string Source = SourceText(Location);
   if (!Source.empty()) {
     Event["text"] = FSources.Line(Location.Source, Location.Line);
@@ -150,25 +198,57 @@ void TCliSession::OnResumed(Integer ThreadId) {
 }
 
 void TCliSession::OnExited(Integer Code, const std::string& Signal) {
-  FState = TRunState::Exited;
+  const TRunState Before = FState;
+  const TEnding Ending = FEnding;
+  FEnding = TEnding::None;
+  FPausing = false;
   ++FStopCount;
-  nlohmann::json Event = {{"event", "exited"}, {"code", Code}};
-  std::string Text = "Program exited with code " + std::to_string(Code);
-  if (!Signal.empty()) {
+  nlohmann::json Event = {{"event", "exited"}};
+  std::string Text;
+  if (Ending == TEnding::Detach) {
+    FState = TRunState::Detached;
+    Event["reason"] = "detached";
+    Text = "Detached; the program goes on.";
+  } else if (Ending == TEnding::Kill) {
+    FState = TRunState::Exited;
+    Event["reason"] = "killed";
+    Text = "Program killed.";
+  } else if (IsSignalName(Signal)) {
+    FState = TRunState::Exited;
+    Event["reason"] = "signal";
     Event["signal"] = Signal;
-    Text = "Program ended: " + Signal + " (code " + std::to_string(Code) + ")";
+    Text = "Program ended by signal " + SignalWords(Signal, "") + ".";
+  } else if (!Signal.empty() && Before == TRunState::Loaded) {
+    FState = TRunState::Exited;
+    Event["reason"] = "start-failed";
+    Event["message"] = Signal;
+    Text = "The program could not be started: " + Signal;
+  } else if (!Signal.empty()) {
+    FState = TRunState::Lost;
+    Event["reason"] = "debugger-lost";
+    Event["message"] = Signal;
+    Text = "Debugger lost: " + Signal;
+  } else {
+    FState = TRunState::Exited;
+    Event["reason"] = "exited";
+    Event["code"] = Code;
+    Text = "Program exited with code " + std::to_string(Code) + ".";
   }
   FOutput.Emit(Event, Text);
 }
 
 void TCliSession::OnThreadCreated(Integer ThreadId) {
   FThreads.insert(ThreadId);
-  FOutput.Emit({{"event", "thread-created"}, {"thread", ThreadId}}, "[thread " + std::to_string(ThreadId) + " created]");
+  if (FOptions.ThreadEvents)
+    FOutput.Emit({{"event", "thread-created"}, {"thread", ThreadId}},
+                 "[thread " + std::to_string(ThreadId) + " created]");
 }
 
 void TCliSession::OnThreadExited(Integer ThreadId) {
   FThreads.erase(ThreadId);
-  FOutput.Emit({{"event", "thread-exited"}, {"thread", ThreadId}}, "[thread " + std::to_string(ThreadId) + " exited]");
+  if (FOptions.ThreadEvents)
+    FOutput.Emit({{"event", "thread-exited"}, {"thread", ThreadId}},
+                 "[thread " + std::to_string(ThreadId) + " exited]");
 }
 
 void TCliSession::OnModule(const TGDBModule& Module, bool Loaded) {
@@ -177,15 +257,16 @@ void TCliSession::OnModule(const TGDBModule& Module, bool Loaded) {
   FOutput.Emit({{"event", Loaded ? "module-loaded" : "module-unloaded"},
                 {"name", Module.Name},
                 {"path", Module.Path},
-                {"base", Module.BaseAddress}},
+                {"base", HexAddress(Module.BaseAddress)}},
                "");
 }
 
 void TCliSession::OnSignal(Integer ThreadId, const TGDBException& Signal) {
+  // The stop that follows names the signal in the text form.
+  FLastSignal = Signal;
   nlohmann::json Event = {{"event", "signal"}, {"thread", ThreadId}, {"name", Signal.Name}, {"description", Signal.Desc}};
   Event.update(LocationJson(Signal.Location));
-  FOutput.Emit(Event, "Signal " + Signal.Name + (Signal.Desc.empty() ? "" : " (" + Signal.Desc + ")") +
-                          " in thread " + std::to_string(ThreadId));
+  FOutput.Emit(Event, "");
 }
 
 void TCliSession::OnException(Integer ThreadId, const TGDBException& Exception) {
@@ -197,19 +278,34 @@ void TCliSession::OnException(Integer ThreadId, const TGDBException& Exception) 
 }
 
 void TCliSession::OnLog(const TGDBLogEvent& Event) {
+  if (Event.Event == etConsole) {
+    // GDB writes a console line in pieces: whole lines are reported.
+    FConsoleText += Event.Data;
+    for (size_t End = FConsoleText.find('\n'); End != std::string::npos; End = FConsoleText.find('\n')) {
+      const std::string Line = FConsoleText.substr(0, End);
+      FConsoleText.erase(0, End + 1);
+      OnConsoleLine(Line);
+    }
+    return;
+  }
   nlohmann::json Object = {{"event", "output"}, {"kind", LogKindWord(Event.Event)}, {"text", Event.Data}};
   if (Event.ThreadId >= 0)
     Object["thread"] = Event.ThreadId;
   std::string Text = Event.Data;
-  // The debugger's banner and start-up chatter: kept for tools, left out of
-  // the text a person reads.
-  if (FState == TRunState::Loaded && Event.Event == etConsole)
-    Text.clear();
-  else if (Event.Event == etError)
+  if (Event.Event == etError)
     Text = "[debugger error] " + Text;
   else if (Event.Event == etInternal)
     Text = "[debugger] " + Text;
   FOutput.Emit(Object, Text);
+}
+
+void TCliSession::OnConsoleLine(const std::string& Line) {
+  if (IsDebuggerChatter(Line))
+    return;
+  // The debugger's banner and start-up chatter: kept for tools, left out of
+  // the text a person reads.
+  FOutput.Emit({{"event", "output"}, {"kind", LogKindWord(etConsole)}, {"text", Line}},
+               FQuietConsole ? "" : Line);
 }
 
 void TCliSession::OnInternalError(const std::string& Message) {
@@ -219,7 +315,7 @@ void TCliSession::OnInternalError(const std::string& Message) {
 void TCliSession::OnDebuggerLost() {
   FState = TRunState::Lost;
   ++FStopCount;
-  FOutput.Emit({{"event", "debugger-lost"}}, "The debugger stopped answering; the session is over.");
+  FOutput.Emit({{"event", "debugger-lost"}}, "Debugger lost: it stopped answering; the session is over.");
 }
 
 void TCliSession::OnRestart() { FOutput.Emit({{"event", "restart"}}, "[the program restarts]"); }

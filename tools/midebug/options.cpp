@@ -28,8 +28,20 @@ const char* const UsageText =
     "  --batch               no prompt; exit at the end of the input\n"
     "  --json                one JSON object per line for each event and answer\n"
     "  --log FILE            keep the debugger's MI traffic in FILE\n"
-    "  --wait SECONDS        how long run, continue and the steps wait for a stop (default 60)\n"
-    "  --help                this text\n";
+    "  --wait SECONDS        in batch mode, how long run, continue and the steps wait for a stop\n"
+    "                        (default 60)\n"
+    "  --stdin FILE          the program reads FILE (default: empty input, it sees end of file)\n"
+    "  --tty DEVICE          the program reads and writes the terminal DEVICE (to type to it)\n"
+    "  --no-thread-events    do not report threads starting and ending\n"
+    "  --help                this text\n"
+    "\n"
+    "The program's arguments reach it exactly as given. Its output is printed as it comes.\n"
+    "At the prompt, while the program runs: pause (or Ctrl-C), kill, detach, threads, quit.\n"
+    "Ending the session (quit, end of input, SIGTERM, SIGHUP) detaches an attached program\n"
+    "and kills a launched one.\n"
+    "\n"
+    "exit status: 0 done; 1 the program could not be loaded or attached; 2 a usage error;\n"
+    "3 in batch mode, a command failed; 128+N ended by signal N (SIGTERM, SIGHUP).\n";
 
 namespace {
 
@@ -103,6 +115,14 @@ bool ParseOptions(int ArgCount, char** Args, TCliOptions& Options, std::string& 
       Options.Batch = true;
     } else if (Arg == "--json") {
       Options.Json = true;
+    } else if (Arg == "--no-thread-events") {
+      Options.ThreadEvents = false;
+    } else if (Arg == "--stdin") {
+      if (!Value(Arg, Options.StdinFile))
+        return false;
+    } else if (Arg == "--tty") {
+      if (!Value(Arg, Options.Tty))
+        return false;
     } else if (Arg == "--profile") {
       if (!Value(Arg, Options.Profile))
         return false;
@@ -172,6 +192,18 @@ bool ParseOptions(int ArgCount, char** Args, TCliOptions& Options, std::string& 
     Error = "no program to debug";
     return false;
   }
+  if (!Options.StdinFile.empty() && !Options.Tty.empty()) {
+    Error = "--stdin and --tty exclude each other";
+    return false;
+  }
+  if ((!Options.StdinFile.empty() || !Options.Tty.empty()) && Options.AttachPid != 0) {
+    Error = "an attached program keeps its own input";
+    return false;
+  }
+  if ((!Options.StdinFile.empty() || !Options.Tty.empty()) && IsLLDBDebugger(Options.Debugger)) {
+    Error = "--stdin and --tty need GDB (LLDB's MI front end starts the program without a shell)";
+    return false;
+  }
   return true;
 }
 
@@ -223,10 +255,23 @@ TGDBCPU GuessCPU(const std::string& Program) {
   }
 }
 
-std::string JoinArguments(const std::vector<std::string>& Arguments, const std::string& Debugger) {
-  // The debugger program's name selects LLDB's front end, as in the library.
-  const bool LLDB = std::filesystem::path(Debugger).filename().string().find("lldb") != std::string::npos;
-  return QuoteProgramArguments(Arguments, LLDB);
+bool IsLLDBDebugger(const std::string& Debugger) {
+  return std::filesystem::path(Debugger).filename().string().find("lldb") != std::string::npos;
+}
+
+std::string ProgramArgumentLine(const TCliOptions& Options) {
+  if (IsLLDBDebugger(Options.Debugger))
+    return QuoteProgramArguments(Options.Arguments, true);
+  std::string Line = QuoteProgramArguments(Options.Arguments, false);
+  if (!Line.empty())
+    Line += " ";
+  // The shell GDB starts the program with applies the redirection over the
+  // library's own terminal; the names are quoted like any argument.
+  if (!Options.Tty.empty()) {
+    const std::string Device = QuoteProgramArguments({Options.Tty}, false);
+    return Line + "<" + Device + " >" + Device + " 2>&1";
+  }
+  return Line + "<" + QuoteProgramArguments({Options.StdinFile.empty() ? "/dev/null" : Options.StdinFile}, false);
 }
 
 std::string LanguageName(TGDBLanguage Language) { return std::string(GDBLanguageNames.at(Language)); }

@@ -28,6 +28,12 @@ struct TCliOptions {
   bool Batch = false;
   bool Json = false;
   std::string LogFile;
+  /// The program's standard input: a file (--stdin), else empty input.
+  std::string StdinFile;
+  /// A terminal the program reads and writes instead (--tty).
+  std::string Tty;
+  /// False with --no-thread-events: thread starts and ends are not reported.
+  bool ThreadEvents = true;
   /// How long a command that resumes the program waits for it to stop.
   int WaitSeconds = 60;
   bool ShowUsage = false;
@@ -48,9 +54,14 @@ TGDBLanguage GuessLanguage(const std::string& Program);
 /// the file is not an ELF file of a known machine.
 TGDBCPU GuessCPU(const std::string& Program);
 
-/// Program arguments as the argument line of Debugger, quoted so that each
-/// reaches the program exactly as given.
-std::string JoinArguments(const std::vector<std::string>& Arguments, const std::string& Debugger);
+/// True when Debugger names LLDB's MI front end, as the library decides.
+bool IsLLDBDebugger(const std::string& Debugger);
+
+/// The argument line for the debugger: the program arguments, quoted so
+/// that each reaches the program exactly as given, then, for GDB (which
+/// starts the program through the shell), the redirection of its input:
+/// --tty's terminal for all three streams, --stdin's file, else /dev/null.
+std::string ProgramArgumentLine(const TCliOptions& Options);
 
 /// The language's name as the command line spells it.
 std::string LanguageName(TGDBLanguage Language);

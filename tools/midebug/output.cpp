@@ -7,12 +7,19 @@
 
 namespace midebug::cli {
 
+void TCliOutput::LeavePrompt() {
+  if (FPromptShown)
+    std::fputc('\n', stdout);
+  FPromptShown = false;
+}
+
 void TCliOutput::Emit(const nlohmann::json& Object, const std::string& Text) {
   if (FJson) {
     // Program output and file names need not be UTF-8; replace what is not.
     const std::string Line = Object.dump(-1, ' ', false, nlohmann::json::error_handler_t::replace);
     std::fprintf(stdout, "%s\n", Line.c_str());
   } else if (!Text.empty()) {
+    LeavePrompt();
     std::fputs(Text.c_str(), stdout);
     if (Text.back() != '\n')
       std::fputc('\n', stdout);
@@ -21,10 +28,12 @@ void TCliOutput::Emit(const nlohmann::json& Object, const std::string& Text) {
 }
 
 void TCliOutput::Error(const std::string& Command, const std::string& Message) {
+  FFailed = true;
   if (FJson) {
     Emit({{"answer", Command}, {"error", Message}}, "");
     return;
   }
+  LeavePrompt();
   std::fflush(stdout);
   std::fprintf(stderr, "error: %s\n", Message.c_str());
   std::fflush(stderr);
@@ -35,6 +44,7 @@ void TCliOutput::Prompt() {
     return;
   std::fputs("(midebug) ", stdout);
   std::fflush(stdout);
+  FPromptShown = true;
 }
 
 void TCliOutput::Echo(const std::string& Line) {
@@ -42,6 +52,12 @@ void TCliOutput::Echo(const std::string& Line) {
     return;
   std::fprintf(stdout, "(midebug) %s\n", Line.c_str());
   std::fflush(stdout);
+}
+
+std::string HexAddress(uint64_t Address, bool Padded) {
+  char Buffer[32];
+  std::snprintf(Buffer, sizeof Buffer, Padded ? "0x%016llx" : "0x%llx", static_cast<unsigned long long>(Address));
+  return Buffer;
 }
 
 std::string TSourceLines::Line(const std::string& File, long Line) {

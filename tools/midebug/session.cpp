@@ -13,6 +13,8 @@ namespace {
 
 /// How long the end of a session waits for the program to go after kill.
 constexpr std::chrono::milliseconds EndWait(5000);
+/// The frames 'bt' shows when not told how many.
+constexpr Integer DefaultFrames = 20;
 /// One pump of the main-thread queue while a command waits.
 constexpr std::chrono::milliseconds PumpSlice(20);
 
@@ -50,12 +52,6 @@ std::string ThreadStateWord(TThreadState State) {
   }
 }
 
-std::string HexAddress(UInt64 Address) {
-  std::ostringstream Stream;
-  Stream << "0x" << std::hex << Address;
-  return Stream.str();
-}
-
 /// The debugger logs in Dir.
 std::set<std::string> DebuggerLogs(const std::string& Dir) {
   std::set<std::string> Logs;
@@ -77,31 +73,34 @@ TCliSession::~TCliSession() { End(); }
 
 const std::vector<TCliSession::TCommandEntry>& TCliSession::Commands() {
   static const std::vector<TCommandEntry> Table = {
-      {"run", &TCliSession::CmdRun, "run", "start the program and wait until it stops or exits"},
-      {"start", &TCliSession::CmdStart, "start", "start the program and stop at main"},
-      {"continue", &TCliSession::CmdContinue, "continue", "resume the stopped program"},
-      {"next", &TCliSession::CmdStep, "next", "step over one source line"},
-      {"step", &TCliSession::CmdStep, "step", "step into one source line"},
-      {"finish", &TCliSession::CmdStep, "finish", "run until the current function returns"},
-      {"stepi", &TCliSession::CmdStep, "stepi", "step one instruction, into calls"},
-      {"nexti", &TCliSession::CmdStep, "nexti", "step one instruction, over calls"},
-      {"pause", &TCliSession::CmdPause, "pause", "interrupt the running program"},
-      {"bt", &TCliSession::CmdBacktrace, "bt", "the call stack of the current thread (frame 0 innermost)"},
-      {"threads", &TCliSession::CmdThreads, "threads", "the program's threads"},
-      {"thread", &TCliSession::CmdThread, "thread N", "make thread N the current thread"},
-      {"frame", &TCliSession::CmdFrame, "frame N", "show frame N of the current thread and select it"},
-      {"kill", &TCliSession::CmdKill, "kill", "end the program"},
-      {"detach", &TCliSession::CmdDetach, "detach", "let the program go on without the debugger"},
-      {"quit", &TCliSession::CmdQuit, "quit", "end the session (a launched program is killed, an attached one detached)"},
-      {"print", &TCliSession::CmdPrint, "print[/x|/d|/c] EXPRESSION", "the value of an expression"},
-      {"print/x", &TCliSession::CmdPrint, "print/x EXPRESSION", "the value in hexadecimal"},
-      {"print/d", &TCliSession::CmdPrint, "print/d EXPRESSION", "the value in decimal"},
-      {"print/c", &TCliSession::CmdPrint, "print/c EXPRESSION", "the value as a character"},
-      {"set", &TCliSession::CmdSetVar, "set var EXPRESSION = VALUE", "assign a value to a variable"},
-      {"info", &TCliSession::CmdInfoValues, "info locals|args", "the current frame's locals or arguments"},
-      {"inspect", &TCliSession::CmdInspect, "inspect EXPRESSION [FROM COUNT]", "a value's children, one level"},
-      {"display", &TCliSession::CmdDisplay, "display EXPRESSION", "print an expression at every stop"},
-      {"help", &TCliSession::CmdHelp, "help", "this list"},
+      {"run", &TCliSession::CmdRun, 0, "run", "start the program (again after it ended) and let it run"},
+      {"start", &TCliSession::CmdStart, 0, "start", "start the program and stop at main"},
+      {"continue", &TCliSession::CmdContinue, 0, "continue", "resume the stopped program"},
+      {"next", &TCliSession::CmdStep, 0, "next", "step over one source line"},
+      {"step", &TCliSession::CmdStep, 0, "step", "step into one source line"},
+      {"finish", &TCliSession::CmdStep, 0, "finish", "run until the current function returns"},
+      {"stepi", &TCliSession::CmdStep, 0, "stepi", "step one instruction, into calls"},
+      {"nexti", &TCliSession::CmdStep, 0, "nexti", "step one instruction, over calls"},
+      {"pause", &TCliSession::CmdPause, 0, "pause", "interrupt the running program (Ctrl-C does too)"},
+      {"bt", &TCliSession::CmdBacktrace, 1, "bt [N|-N]",
+       "the call stack of the current thread: the innermost frames, the innermost N, or the outermost N"},
+      {"threads", &TCliSession::CmdThreads, 0, "threads", "the program's threads"},
+      {"thread", &TCliSession::CmdThread, 1, "thread N", "make thread N the current thread"},
+      {"frame", &TCliSession::CmdFrame, 1, "frame N", "show frame N of the current thread and select it"},
+      {"kill", &TCliSession::CmdKill, 0, "kill", "end the program"},
+      {"detach", &TCliSession::CmdDetach, 0, "detach", "let the program go on without the debugger"},
+      {"quit", &TCliSession::CmdQuit, 0, "quit",
+       "end the session (a launched program is killed, an attached one detached)"},
+      {"print", &TCliSession::CmdPrint, AnyArguments, "print[/x|/d|/c] EXPRESSION", "the value of an expression"},
+      {"print/x", &TCliSession::CmdPrint, AnyArguments, "print/x EXPRESSION", "the value in hexadecimal"},
+      {"print/d", &TCliSession::CmdPrint, AnyArguments, "print/d EXPRESSION", "the value in decimal"},
+      {"print/c", &TCliSession::CmdPrint, AnyArguments, "print/c EXPRESSION", "the value as a character"},
+      {"set", &TCliSession::CmdSetVar, AnyArguments, "set var EXPRESSION = VALUE", "assign a value to a variable"},
+      {"info", &TCliSession::CmdInfoValues, 1, "info locals|args", "the current frame's locals or arguments"},
+      {"inspect", &TCliSession::CmdInspect, AnyArguments, "inspect EXPRESSION [FROM COUNT]",
+       "a value's children, one level"},
+      {"display", &TCliSession::CmdDisplay, AnyArguments, "display EXPRESSION", "print an expression at every stop"},
+      {"help", &TCliSession::CmdHelp, 0, "help", "this list"},
   };
   return Table;
 }
@@ -134,13 +133,22 @@ bool TCliSession::Start() {
       PumpUntilStopAfter(0, std::chrono::seconds(FOptions.WaitSeconds));
       return true;
     }
+    // A program on this host is checked now: the debugger would only fail
+    // once it is run, with a shell's exit code.
+    if (FOptions.Profile == "local" && !IsExecutableFile(FOptions.Program)) {
+      std::error_code Ignored;
+      FOutput.Error("start", std::filesystem::exists(FOptions.Program, Ignored)
+                                 ? FOptions.Program + " is not an executable program"
+                                 : FOptions.Program + ": no such file");
+      return false;
+    }
+    if (!FOptions.StdinFile.empty() && !std::filesystem::is_regular_file(FOptions.StdinFile)) {
+      FOutput.Error("start", "the program's input " + FOptions.StdinFile + " is not a readable file");
+      return false;
+    }
     const TGDBLanguage Language = FOptions.Language.value_or(GuessLanguage(FOptions.Program));
     const TGDBCPU CPU = FOptions.CPU.value_or(GuessCPU(FOptions.Program));
-    const std::string Arguments = JoinArguments(FOptions.Arguments, FOptions.Debugger);
-    FProcess = TGDBProcessManager::CreateProcess(FListener, FOptions.Program, Arguments,
-                                                 std::filesystem::current_path().string(), FOptions.Profile,
-                                                 FOptions.Platform, Language, CPU, FOptions.Debugger);
-    FState = TRunState::Loaded;
+    Load(Language, CPU);
     FOutput.Emit({{"event", "loaded"},
                   {"program", FOptions.Program},
                   {"language", LanguageName(Language)},
@@ -154,6 +162,25 @@ bool TCliSession::Start() {
   }
 }
 
+void TCliSession::Load(TGDBLanguage Language, TGDBCPU CPU) {
+  FLanguage = Language;
+  FCPU = CPU;
+  // A local program is named by its full path: the debugger need not share
+  // the session's idea of the current directory.
+  std::string Program = FOptions.Program;
+  if (FOptions.Profile == "local")
+    Program = std::filesystem::absolute(Program).lexically_normal().string();
+  FProcess = TGDBProcessManager::CreateProcess(FListener, Program, ProgramArgumentLine(FOptions),
+                                               std::filesystem::current_path().string(), FOptions.Profile,
+                                               FOptions.Platform, Language, CPU, FOptions.Debugger);
+  FState = TRunState::Loaded;
+  FQuietConsole = true;
+  FEnding = TEnding::None;
+  FThreads.clear();
+  FCurrentThread = -1;
+  FCurrentFrame = 0;
+}
+
 bool TCliSession::Execute(const std::string& Line) {
   std::vector<std::string> Words = SplitWords(Line.substr(0, Line.find('#')));
   if (Words.empty())
@@ -163,6 +190,11 @@ bool TCliSession::Execute(const std::string& Line) {
   for (const TCommandEntry& Entry : Commands()) {
     if (Name != Entry.Name)
       continue;
+    if (Words.size() > Entry.MaxArguments) {
+      FOutput.Error(Name, Entry.MaxArguments == 0 ? "'" + Name + "' takes no arguments"
+                                                  : "usage: " + std::string(Entry.Usage));
+      return true;
+    }
     try {
       (this->*Entry.Handler)(Name, Words);
     } catch (const std::exception& Error) {
@@ -178,16 +210,11 @@ bool TCliSession::Execute(const std::string& Line) {
 void TCliSession::End() {
   if (FProcess) {
     try {
-      // As GDB does: a program that was attached to goes on, one that was
-      // launched ends with the session.
-      if (FOptions.AttachPid != 0 && FState == TRunState::Stopped) {
-        FProcess->Detach();
-        FState = TRunState::Detached;
-      } else if (FState == TRunState::Stopped || FState == TRunState::Running) {
-        const uint64_t Before = FStopCount;
-        FProcess->Terminate();
-        PumpUntilStopAfter(Before, EndWait);
-      }
+      // Whatever ends the session, a program that was attached to goes on
+      // and one that was launched ends with it; the library pauses a running
+      // program first.
+      if (FState == TRunState::Stopped || FState == TRunState::Running)
+        EndProgram(FOptions.AttachPid != 0 ? TEnding::Detach : TEnding::Kill);
     } catch (const std::exception& Error) {
       FOutput.Error("quit", Error.what());
     }
@@ -197,6 +224,48 @@ void TCliSession::End() {
   }
   FListener->Forget();
   KeepLog();
+}
+
+bool TCliSession::EndProgram(TEnding How) {
+  const uint64_t Before = FStopCount;
+  FEnding = How;
+  if (How == TEnding::Detach)
+    FProcess->Detach();
+  else
+    FProcess->Terminate();
+  // Both calls return once done, and report the end unless they failed.
+  ProcessPending();
+  if (FStopCount == Before) {
+    FEnding = TEnding::None;
+    return false;
+  }
+  return true;
+}
+
+bool TCliSession::HandleSignals() {
+  switch (TakeHostSignal()) {
+  case THostSignal::Terminate:
+    FTerminated = true;
+    FQuit = true;
+    return false;
+  case THostSignal::Interrupt:
+    if (FState == TRunState::Running)
+      RequestPause();
+    return true;
+  case THostSignal::None:
+  default:
+    return true;
+  }
+}
+
+void TCliSession::RequestPause() {
+  FPausing = true;
+  try {
+    FProcess->Pause();
+  } catch (const std::exception& Error) {
+    FPausing = false;
+    FOutput.Error("pause", Error.what());
+  }
 }
 
 void TCliSession::KeepLog() {
@@ -229,7 +298,7 @@ void TCliSession::KeepLog() {
 bool TCliSession::PumpUntilStopAfter(uint64_t Before, std::chrono::milliseconds Limit) {
   const auto Deadline = std::chrono::steady_clock::now() + Limit;
   while (FStopCount == Before) {
-    if (std::chrono::steady_clock::now() >= Deadline)
+    if (!HandleSignals() || std::chrono::steady_clock::now() >= Deadline)
       return false;
     WaitAndProcess(PumpSlice);
   }
@@ -261,12 +330,27 @@ std::string RunStateWord(TRunState State) {
 
 } // namespace
 
+std::chrono::milliseconds TCliSession::WaitLimit() const {
+  if (FOptions.Batch)
+    return std::chrono::seconds(FOptions.WaitSeconds);
+  return std::chrono::hours(24 * 365);
+}
+
 void TCliSession::ResumeAndWait(const std::string& Name, const std::function<void()>& Resume) {
   // Counted before resuming, so that a stop reported during the resuming
   // call itself is not missed.
   const uint64_t Before = FStopCount;
   Resume();
-  if (!PumpUntilStopAfter(Before, std::chrono::seconds(FOptions.WaitSeconds))) {
+  if (!FWaitForStops) {
+    // The prompt comes back at once; the stop is printed when it comes.
+    if (FStopCount == Before && Name != "kill" && FState != TRunState::Lost)
+      FState = TRunState::Running;
+    FOutput.Emit({{"answer", Name}, {"state", RunStateWord(FState)}}, "");
+    return;
+  }
+  if (!PumpUntilStopAfter(Before, WaitLimit())) {
+    if (FQuit)
+      return;
     // Still running as far as anyone knows: 'pause' and 'kill' now apply.
     if (Name != "pause" && Name != "kill")
       FState = TRunState::Running;
@@ -311,22 +395,35 @@ TIntfPtr<IGDBThread> TCliSession::CurrentThread(const std::string& Name) {
   return Thread;
 }
 
-void TCliSession::CmdRun(const std::string& Name, const std::vector<std::string>& /*Arguments*/) {
-  if (FState != TRunState::Loaded) {
-    FOutput.Error(Name, "the program was already started (state: " + RunStateWord(FState) + ")");
-    return;
+bool TCliSession::RequireStartable(const std::string& Name) {
+  if (FState == TRunState::Loaded)
+    return true;
+  if (FState == TRunState::Exited && FOptions.AttachPid == 0) {
+    // The debugger goes with the program it ran: a new one runs it again.
+    FProcess = nullptr;
+    ProcessPending();
+    Load(FLanguage, FCPU);
+    return true;
   }
+  FOutput.Error(Name, FState == TRunState::Stopped || FState == TRunState::Running
+                          ? "the program is already running; 'kill' ends it"
+                          : "the program cannot be started again (state: " + RunStateWord(FState) + ")");
+  return false;
+}
+
+void TCliSession::CmdRun(const std::string& Name, const std::vector<std::string>& /*Arguments*/) {
+  if (!RequireStartable(Name))
+    return;
   ResumeAndWait(Name, [this] { FProcess->Run(); });
 }
 
 void TCliSession::CmdStart(const std::string& Name, const std::vector<std::string>& /*Arguments*/) {
-  if (FState != TRunState::Loaded) {
-    FOutput.Error(Name, "the program was already started (state: " + RunStateWord(FState) + ")");
+  if (!RequireStartable(Name))
+    return;
+  if (!FProcess->SetRunToMainBreakpoint()) {
+    FOutput.Error(Name, "the program has no main function; 'run' runs it");
     return;
   }
-  if (!FProcess->SetRunToMainBreakpoint())
-    FOutput.Emit({{"event", "warning"}, {"message", "no main function found; running"}},
-                 "warning: no main function found; running");
   ResumeAndWait(Name, [this] { FProcess->Run(); });
 }
 
@@ -361,33 +458,60 @@ void TCliSession::CmdPause(const std::string& Name, const std::vector<std::strin
     FOutput.Error(Name, "the program is not running");
     return;
   }
-  ResumeAndWait(Name, [this] { FProcess->Pause(); });
+  ResumeAndWait(Name, [this] { RequestPause(); });
 }
 
-void TCliSession::CmdBacktrace(const std::string& Name, const std::vector<std::string>& /*Arguments*/) {
+void TCliSession::CmdBacktrace(const std::string& Name, const std::vector<std::string>& Arguments) {
+  // "bt N": the innermost N frames; "bt -N": the outermost N.
+  Integer Wanted = DefaultFrames;
+  bool Outermost = false;
+  if (!Arguments.empty()) {
+    Outermost = Arguments[0].starts_with('-');
+    if (!ParseNumber(Arguments[0].substr(Outermost ? 1 : 0), Wanted) || Wanted == 0) {
+      FOutput.Error(Name, "usage: bt [N|-N]");
+      return;
+    }
+  }
   if (!RequireStopped(Name))
     return;
   TIntfPtr<IGDBThread> Thread = CurrentThread(Name);
   if (!Thread)
     return;
   const Integer Count = Thread->GetCallCount();
+  const Integer First = Outermost ? std::max<Integer>(1, Count - Wanted + 1) : 1;
+  const Integer Last = Outermost ? Count : std::min(Count, Wanted);
   nlohmann::json Frames = nlohmann::json::array();
   std::string Text;
-  for (Integer Index = 1; Index <= Count; ++Index) {
+  for (Integer Index = First; Index <= Last; ++Index) {
     const std::string Header = Thread->GetCallHeader(Index);
     const TGDBLocation Location = Thread->GetCallLocation(Index);
     nlohmann::json Frame = {{"level", Index - 1}, {"header", Header}};
     Frame.update(LocationJson(Location));
     Frames.push_back(Frame);
-    Text += (Index - 1 == FCurrentFrame ? "* #" : "  #") + std::to_string(Index - 1) + "  " + Header + " at " +
-            LocationText(Location) + "\n";
+    Text += (Index - 1 == FCurrentFrame ? "* " : "  ") + FrameText(Index - 1, Header, Location) + "\n";
   }
+  const Integer Hidden = Count - (Last - First + 1);
   if (Count <= 0)
     Text = "No stack.";
-  FOutput.Emit({{"answer", Name}, {"thread", FCurrentThread}, {"frames", Frames}}, Text);
+  else if (Hidden > 0)
+    Text += "(" + std::to_string(Hidden) + (Outermost ? " inner" : " more") +
+            " frames; 'bt N' shows the innermost N, 'bt -N' the outermost N, 'frame N' any one)\n";
+  FOutput.Emit({{"answer", Name}, {"thread", FCurrentThread}, {"frames", Frames}, {"total", Count}}, Text);
 }
 
 void TCliSession::CmdThreads(const std::string& Name, const std::vector<std::string>& /*Arguments*/) {
+  if (FState == TRunState::Running) {
+    // A running program's threads are not asked where they are.
+    nlohmann::json Threads = nlohmann::json::array();
+    std::string Text;
+    for (const Integer Id : FThreads) {
+      Threads.push_back({{"id", Id}, {"state", "running"}, {"current", Id == FCurrentThread}});
+      Text += (Id == FCurrentThread ? "* " : "  ") + std::to_string(Id) + "  running\n";
+    }
+    FOutput.Emit({{"answer", Name}, {"current", FCurrentThread}, {"threads", Threads}},
+                 Threads.empty() ? "No threads known yet." : Text);
+    return;
+  }
   if (!RequireStopped(Name))
     return;
   // The interfaces list no threads: the session knows them from the events
@@ -462,7 +586,7 @@ void TCliSession::CmdFrame(const std::string& Name, const std::vector<std::strin
   const TGDBLocation Location = Thread->GetCallLocation(Level + 1);
   nlohmann::json Answer = {{"answer", Name}, {"thread", FCurrentThread}, {"level", Level}, {"header", Header}};
   Answer.update(LocationJson(Location));
-  std::string Text = "#" + std::to_string(Level) + "  " + Header + " at " + LocationText(Location);
+  std::string Text = FrameText(Level, Header, Location);
   if (const std::string Source = SourceText(Location); !Source.empty())
     Text += "\n" + Source;
   FOutput.Emit(Answer, Text);
@@ -473,15 +597,21 @@ void TCliSession::CmdKill(const std::string& Name, const std::vector<std::string
     FOutput.Error(Name, "the program is not running");
     return;
   }
-  ResumeAndWait(Name, [this] { FProcess->Terminate(); });
+  if (!EndProgram(TEnding::Kill))
+    FOutput.Error(Name, "the program did not end");
+  else
+    FOutput.Emit({{"answer", Name}, {"state", RunStateWord(FState)}}, "");
 }
 
 void TCliSession::CmdDetach(const std::string& Name, const std::vector<std::string>& /*Arguments*/) {
-  if (!RequireStopped(Name))
+  if (FState != TRunState::Stopped && FState != TRunState::Running) {
+    FOutput.Error(Name, "the program is not running");
     return;
-  FProcess->Detach();
-  FState = TRunState::Detached;
-  FOutput.Emit({{"answer", Name}, {"state", RunStateWord(FState)}}, "Detached; the program goes on.");
+  }
+  if (!EndProgram(TEnding::Detach))
+    FOutput.Error(Name, "the debugger could not detach from the program");
+  else
+    FOutput.Emit({{"answer", Name}, {"state", RunStateWord(FState)}}, "");
 }
 
 void TCliSession::CmdQuit(const std::string& Name, const std::vector<std::string>& /*Arguments*/) {
@@ -523,6 +653,65 @@ std::string TCliSession::LocationText(const TGDBLocation& Location) const {
     Text += ":" + std::to_string(Location.Line);
   if (!Address.empty())
     Text += " (" + Address + ")";
+  return Text;
+}
+
+namespace {
+
+/// Drops the ", a@entry=V" that GDB adds beside "a=V" when the argument
+/// still has the value it entered with.
+std::string DropUnchangedEntryValues(std::string Call) {
+  static const std::string Marker = "@entry=";
+  for (size_t At = Call.find(Marker); At != std::string::npos; At = Call.find(Marker, At + 1)) {
+    const size_t NameStart = Call.rfind(", ", At);
+    if (NameStart == std::string::npos)
+      continue;
+    const std::string ArgName = Call.substr(NameStart + 2, At - NameStart - 2);
+    const size_t ValueStart = At + Marker.size();
+    for (const std::string& Before : {"(" + ArgName + "=", ", " + ArgName + "="}) {
+      const size_t Plain = Call.find(Before);
+      if (Plain == std::string::npos || Plain >= NameStart)
+        continue;
+      const size_t PlainValue = Plain + Before.size();
+      const std::string Value = Call.substr(PlainValue, NameStart - PlainValue);
+      if (Call.compare(ValueStart, Value.size(), Value) != 0)
+        continue;
+      const size_t After = ValueStart + Value.size();
+      if (After == Call.size() || Call[After] == ',' || Call[After] == ')') {
+        Call.erase(NameStart, After - NameStart);
+        At = NameStart;
+        break;
+      }
+    }
+  }
+  return Call;
+}
+
+} // namespace
+
+std::string TCliSession::FrameText(Integer Level, const std::string& Header, const TGDBLocation& Location) const {
+  // The library writes ":ADDRESS name(arguments)"; GDB users read
+  // "0xADDRESS in name (arguments)", the address left out for the innermost
+  // frame at a source line.
+  std::string Call = Header;
+  if (Call.starts_with(':')) {
+    const size_t Blank = Call.find(' ');
+    Call = Blank == std::string::npos ? "" : Call.substr(Blank + 1);
+  }
+  if (const size_t Open = Call.find('('); Open != std::string::npos && Open > 0 && Call[Open - 1] != ' ')
+    Call.insert(Open, " ");
+  Call = DropUnchangedEntryValues(Call);
+  if (Call.empty() || Call == ";")
+    Call = "??";
+  std::string Text = Level >= 0 ? "#" + std::to_string(Level) + "  " : "";
+  if (Location.Address != 0 && (Level > 0 || Location.Source.empty() || Location.Line <= 0))
+    Text += HexAddress(Location.Address, true) + " in ";
+  Text += Call;
+  if (!Location.Source.empty()) {
+    Text += " at " + std::filesystem::path(Location.Source).filename().string();
+    if (Location.Line > 0)
+      Text += ":" + std::to_string(Location.Line);
+  }
   return Text;
 }
 

@@ -58,6 +58,15 @@ public:
   bool Start();
   /// Runs one command line; false when the session is to end.
   bool Execute(const std::string& Line);
+  /// Whether a command that resumes the program waits for its stop (a
+  /// script, batch mode) or hands the prompt back at once (a person at the
+  /// prompt, who sees the stop when it comes).
+  void SetWaitForStops(bool Wait) { FWaitForStops = Wait; }
+  /// Acts on a caught signal: Ctrl-C pauses a running program; SIGTERM and
+  /// SIGHUP end the session. False when the session is to end.
+  bool HandleSignals();
+  /// True when a terminating signal ended the session.
+  bool Terminated() const { return FTerminated; }
   /// Ends the program if it still runs, lets the debugger go and keeps its
   /// log when asked to.
   void End();
@@ -78,9 +87,12 @@ public:
 
 private:
   using TCommand = void (TCliSession::*)(const std::string& Name, const std::vector<std::string>& Arguments);
+  /// One command: its handler, how many words may follow its name, and
+  /// the lines 'help' shows.
   struct TCommandEntry {
     const char* Name;
     TCommand Handler;
+    size_t MaxArguments;
     const char* Usage;
     const char* Help;
   };
@@ -101,6 +113,8 @@ private:
   void CmdHelp(const std::string& Name, const std::vector<std::string>& Arguments);
 
   // --- Values (evaluatecommands.cpp) -------------------------------------
+  /// An expression takes any number of words.
+  static constexpr size_t AnyArguments = SIZE_MAX;
   void CmdPrint(const std::string& Name, const std::vector<std::string>& Arguments);
   void CmdSetVar(const std::string& Name, const std::vector<std::string>& Arguments);
   void CmdInfoValues(const std::string& Name, const std::vector<std::string>& Arguments);
@@ -115,22 +129,40 @@ private:
   std::vector<TDisplay> FDisplays;
   // --- end of values ------------------------------------------------------
 
+  /// Has the debugger load the program (again); raises when it cannot.
+  void Load(TGDBLanguage Language, TGDBCPU CPU);
   /// True when the program can be resumed or stepped; otherwise prints why.
   bool RequireStopped(const std::string& Name);
+  /// True when 'run' or 'start' may start the program; otherwise prints why.
+  bool RequireStartable(const std::string& Name);
   /// The thread commands act on, or null with the reason printed.
   TIntfPtr<IGDBThread> CurrentThread(const std::string& Name);
   /// Calls Resume (which starts or resumes the program), then pumps the
   /// main-thread queue until the program stops, exits or the debugger is
   /// lost, or the wait limit passes; then answers Name.
   void ResumeAndWait(const std::string& Name, const std::function<void()>& Resume);
-  /// Pumps until the stop count moves past Before or Limit passes.
+  /// Pumps until the stop count moves past Before or Limit passes, pausing
+  /// the program on Ctrl-C; false when the time passed or the session is to
+  /// end.
   bool PumpUntilStopAfter(uint64_t Before, std::chrono::milliseconds Limit);
+  /// How long a resuming command waits: --wait in batch mode, else until
+  /// the stop.
+  std::chrono::milliseconds WaitLimit() const;
+  /// Kills or detaches the program; false when it is still there.
+  enum class TEnding : uint8_t { None, Kill, Detach };
+  bool EndProgram(TEnding How);
+  /// Asks a running program to pause; its stop is then reported as paused.
+  void RequestPause();
+  /// A frame as GDB users read it: "#1  0x... in f (a=1) at f.c:7".
+  std::string FrameText(Integer Level, const std::string& Header, const TGDBLocation& Location) const;
   /// A location as JSON fields and as "file:line" text.
   nlohmann::json LocationJson(const TGDBLocation& Location) const;
   std::string LocationText(const TGDBLocation& Location) const;
   /// The source text line under Location, indented, or empty.
   std::string SourceText(const TGDBLocation& Location);
   void KeepLog();
+  /// One whole line of debugger console text.
+  void OnConsoleLine(const std::string& Line);
 
   const TCliOptions& FOptions;
   TCliOutput& FOutput;
@@ -138,6 +170,8 @@ private:
   TIntfPtr<TCliListener> FListener;
   TIntfPtr<IGDBProcess> FProcess;
   TRunState FState = TRunState::Loaded;
+  TGDBLanguage FLanguage = glC;
+  TGDBCPU FCPU = gcAMD64;
   /// Counts stops, exits and the loss of the debugger: the events a command
   /// that resumes the program waits for.
   uint64_t FStopCount = 0;
@@ -146,6 +180,19 @@ private:
   Integer FCurrentFrame = 0;
   std::set<Integer> FThreads;
   bool FQuit = false;
+  bool FTerminated = false;
+  bool FWaitForStops = true;
+  /// Set by a pause the session asked for, until the stop it brings.
+  bool FPausing = false;
+  /// The end the session itself asked for, so that it is reported as such.
+  TEnding FEnding = TEnding::None;
+  /// The last signal reported, for the stop it brings.
+  TGDBException FLastSignal;
+  /// Debugger console text is left out of the text form until the program
+  /// starts or the attach stop: the debugger's banner and start-up chatter.
+  bool FQuietConsole = true;
+  /// Console text received after its last line break.
+  std::string FConsoleText;
   /// The debugger logs present before start-up, so that the new one is found.
   std::set<std::string> FLogsBefore;
   std::string FLogDir;
