@@ -1,6 +1,7 @@
 # What `cmake --install <build> [--prefix <dir>]` puts in place: the library
 # with its soname, the boundary header and the headers it reaches, the
-# console debugger, a CMake package (midebug::midebug) and a pkg-config file.
+# console debugger, the debug adapter, a CMake package (midebug::midebug) and
+# a pkg-config file.
 
 include(CMakePackageConfigHelpers)
 include(${CMAKE_CURRENT_LIST_DIR}/PublicHeaders.cmake)
@@ -15,8 +16,8 @@ install(TARGETS midebug EXPORT midebugTargets
 # The installed program finds the installed library wherever the prefix is.
 file(RELATIVE_PATH MIDEBUG_BIN_TO_LIB
   ${CMAKE_INSTALL_FULL_BINDIR} ${CMAKE_INSTALL_FULL_LIBDIR})
-set_target_properties(midebug-cli PROPERTIES INSTALL_RPATH "$ORIGIN/${MIDEBUG_BIN_TO_LIB}")
-install(TARGETS midebug-cli RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR})
+set_target_properties(midebug-cli midebug-dap PROPERTIES INSTALL_RPATH "$ORIGIN/${MIDEBUG_BIN_TO_LIB}")
+install(TARGETS midebug-cli midebug-dap RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR})
 
 midebug_header_closure(MIDEBUG_PUBLIC_HEADERS
   ROOT ${CMAKE_CURRENT_SOURCE_DIR}/src

@@ -3,6 +3,8 @@
 set -euo pipefail
 
 packages=(cmake ninja-build g++ clang libclang-rt-14-dev gdb fpc libgtest-dev libgmock-dev libbenchmark-dev nlohmann-json3-dev pkg-config)
+# The debug adapter's tests run on node; the machine's own node is used where there is one.
+command -v node >/dev/null 2>&1 || packages+=(nodejs npm)
 missing=()
 for package in "${packages[@]}"; do
   dpkg-query -W -f='${Status}' "$package" 2>/dev/null | grep -q "install ok installed" || missing+=("$package")

@@ -1,7 +1,8 @@
 #!/usr/bin/env bash
-# Builds midebug and runs the whole test suite three times, in a normal build,
-# one with AddressSanitizer + UndefinedBehaviorSanitizer and one with
-# ThreadSanitizer, then fuzzes the MI output parser for a minute.
+# Builds midebug and runs the whole test suite three times, in a normal build
+# (with the debug adapter's protocol tests), one with AddressSanitizer +
+# UndefinedBehaviorSanitizer and one with ThreadSanitizer, then fuzzes the MI
+# output parser for a minute.
 set -euo pipefail
 cd "$(dirname "$0")/.."
 scripts/install-deps.sh
@@ -17,6 +18,8 @@ run_suite() {
 
 echo "== normal build"
 run_suite build -DCMAKE_BUILD_TYPE=RelWithDebInfo
+echo "== debug adapter, driven by the protocol's client library"
+(cd tests/dap && npm ci --no-audit --no-fund --loglevel=error && MIDEBUG_BUILD_DIR="$PWD/../../build" node --test)
 echo "== AddressSanitizer + UndefinedBehaviorSanitizer build"
 ASAN_OPTIONS=detect_leaks=1:abort_on_error=1 UBSAN_OPTIONS=print_stacktrace=1:halt_on_error=1 \
   run_suite build-asan -DCMAKE_BUILD_TYPE=Debug -DMIDEBUG_SANITIZE=asan-ubsan -DMIDEBUG_BENCHMARKS=OFF

@@ -11,6 +11,7 @@
 #include <filesystem>
 #include <fstream>
 #include <functional>
+#include <regex>
 #include <sstream>
 #include <string>
 #include <signal.h>
@@ -48,6 +49,21 @@ struct TCliRun {
   const json* Answer(const std::string& Name) const {
     return Find([&](const json& Line) { return Line.value("answer", "") == Name; });
   }
+  std::vector<json> Events(const std::string& Name) const {
+    std::vector<json> Found;
+    for (const json& Line : Lines)
+      if (Line.value("event", "") == Name)
+        Found.push_back(Line);
+    return Found;
+  }
+  /// Everything the program printed, joined.
+  std::string Output() const {
+    std::string Text;
+    for (const json& Line : Events("output"))
+      if (Line.value("kind", "") == "output")
+        Text += Line.value("text", "");
+    return Text;
+  }
 };
 
 std::string ReadAll(const std::string& Path) {
@@ -60,13 +76,13 @@ std::string Quote(const std::string& Text) { return "'" + Text + "'"; }
 class CliTest : public ::testing::Test {
 protected:
   /// Runs `midebug --batch --json --wait LIMIT Arguments` with Commands on
-  /// its standard input.
-  TCliRun RunCli(const std::string& Arguments, const std::string& Commands) {
+  /// its standard input (without --json for the text a person reads).
+  TCliRun RunCli(const std::string& Arguments, const std::string& Commands, bool Json = true) {
     const std::string Input = Scratch.WriteFile("commands.txt", Commands);
     const std::string Output = Scratch.Path() + "/stdout.txt";
     const std::string Errors = Scratch.Path() + "/stderr.txt";
     const std::string Command = "cd " + Quote(Scratch.Path()) + " && " + Quote(MIDEBUG_CLI) +
-                                " --batch --json --wait " + WaitLimit + " " + Arguments + " < " + Quote(Input) +
+                                " --batch " + (Json ? "--json " : "") + "--wait " + WaitLimit + " " + Arguments + " < " + Quote(Input) +
                                 " > " + Quote(Output) + " 2> " + Quote(Errors);
     TCliRun Run;
     const int Status = std::system(Command.c_str());
@@ -74,7 +90,7 @@ protected:
     Run.Stdout = ReadAll(Output);
     Run.Stderr = ReadAll(Errors);
     std::istringstream Lines(Run.Stdout);
-    for (std::string Line; std::getline(Lines, Line);) {
+    for (std::string Line; Json && std::getline(Lines, Line);) {
       json Object = json::parse(Line, nullptr, false);
       EXPECT_FALSE(Object.is_discarded()) << "not JSON: " << Line;
       if (!Object.is_discarded())
@@ -195,6 +211,97 @@ TEST_F(CliTest, CliSteppingNextStepAndFinishFollowTheSource) {
   const json* Exited = Run.Event("exited");
   ASSERT_NE(Exited, nullptr);
   EXPECT_EQ((*Exited)["code"], 4);
+}
+
+// --- The program's arguments, input and ends ------------------------------------
+
+TEST_F(CliTest, CliProgramGetsItsArgumentsExactlyAndEmptyOrChosenInput) {
+  const std::string Marker = Scratch.Path() + "/touched";
+  const std::vector<std::string> Arguments = {"$HOME", "*", "x;y", "$(touch " + Marker + ")", "two\nlines", "", "end"};
+  std::string Line;
+  for (const std::string& Argument : Arguments)
+    Line += " " + Quote(Argument);
+  const TCliRun Echoed = RunCli(Quote(Debuggee("argsecho")) + Line, "run\n");
+  EXPECT_EQ(Echoed.ExitCode, 0) << Echoed.Stderr;
+  EXPECT_EQ(Echoed.Output(), "[$HOME]\n[*]\n[x;y]\n[$(touch " + Marker + ")]\n[two\nlines]\n[]\n[end]\n");
+  EXPECT_FALSE(std::filesystem::exists(Marker));
+  // Every address is a hex string, a module's base too.
+  const std::vector<json> Modules = Echoed.Events("module-loaded");
+  ASSERT_FALSE(Modules.empty()) << Echoed.Stdout;
+  EXPECT_TRUE(Modules.front()["base"].get<std::string>().starts_with("0x")) << Modules.front();
+
+  // A program reading its input sees its end at once, or reads --stdin's file.
+  const TCliRun Empty = RunCli(Quote(Debuggee("terminal")) + " read", "run\n");
+  EXPECT_EQ(Empty.Output(), "waiting for input\n");
+  const std::string Input = Scratch.WriteFile("input.txt", "first\nsecond\n");
+  const TCliRun Fed = RunCli("--stdin " + Quote(Input) + " " + Quote(Debuggee("terminal")) + " read", "run\n");
+  EXPECT_EQ(Fed.Output(), "waiting for input\ngot:first\ngot:second\n");
+  for (const TCliRun* Run : {&Empty, &Fed}) {
+    const json* Exited = Run->Event("exited");
+    ASSERT_NE(Exited, nullptr) << Run->Stdout;
+    EXPECT_EQ((*Exited)["code"], 0);
+  }
+}
+
+TEST_F(CliTest, CliEndsAreReportedAsTheyHappenAndTheProgramRunsAgain) {
+  // A relative path, with the debugger named by its path.
+  const std::string Relative =
+      std::filesystem::relative(Debuggee("exitthree"), std::filesystem::canonical(Scratch.Path())).string();
+  const TCliRun Again =
+      RunCli("--debugger /usr/bin/gdb --no-thread-events " + Quote(Relative), "start\nkill\nrun\nstart\ncontinue\n");
+  EXPECT_EQ(Again.ExitCode, 0) << Again.Stderr;
+  const std::vector<json> Ends = Again.Events("exited");
+  ASSERT_EQ(Ends.size(), 3u) << Again.Stdout;
+  EXPECT_EQ(Ends[0], json({{"event", "exited"}, {"reason", "killed"}}));
+  EXPECT_EQ(Ends[1], json({{"event", "exited"}, {"reason", "exited"}, {"code", 3}}));
+  EXPECT_EQ(Ends[2], Ends[1]);
+  EXPECT_EQ(Again.Event("thread-created"), nullptr);
+
+  const TCliRun Signalled = RunCli(Quote(Debuggee("signals")), "run\ncontinue\n");
+  const json* Stop = Signalled.Event("stopped");
+  ASSERT_NE(Stop, nullptr) << Signalled.Stdout;
+  EXPECT_EQ((*Stop)["reason"], "signal");
+  EXPECT_EQ((*Stop)["signal"], "SIGUSR1");
+  const json* End = Signalled.Event("exited");
+  ASSERT_NE(End, nullptr) << Signalled.Stdout;
+  EXPECT_EQ(*End, json({{"event", "exited"}, {"reason", "signal"}, {"signal", "SIGUSR1"}}));
+  // GDB's own notes on threads and the end are not repeated.
+  for (const TCliRun* Run : {&Again, &Signalled})
+    for (const char* Chatter : {"[New Thread", "[Inferior", "Program terminated"})
+      EXPECT_EQ(Run->Output().find(Chatter), std::string::npos) << Run->Output();
+
+  {
+    // A debugger that dies is reported at once, as such.
+    test::TFakeOnPath Fake("gdb", "gdb-dies-on-request.script");
+    const TCliRun Lost = RunCli(Quote(Debuggee("exitthree")), "run\n");
+    const json* Gone = Lost.Event("exited");
+    ASSERT_NE(Gone, nullptr) << Lost.Stdout << Lost.Stderr;
+    EXPECT_EQ((*Gone)["reason"], "debugger-lost") << *Gone;
+  }
+
+  const std::string Text = Scratch.WriteFile("notes.txt", "not a program\n");
+  const TCliRun Refused = RunCli(Quote(Text), "run\n");
+  EXPECT_EQ(Refused.ExitCode, 1);
+  const json* Refusal = Refused.Answer("start");
+  ASSERT_NE(Refusal, nullptr) << Refused.Stdout;
+  EXPECT_EQ((*Refusal)["error"], Text + " is not an executable program");
+}
+
+TEST_F(CliTest, CliBacktraceOfADeepStackReadsLikeGdbsAndReachesEveryFrame) {
+  // Past atoi, two steps per call take main about 25 calls deep into recurse.
+  std::string Commands = "start\nstep\nfinish\n";
+  for (int Step = 0; Step < 50; ++Step)
+    Commands += "step\n";
+  const TCliRun Run =
+      RunCli("--no-thread-events " + Quote(Debuggee("deep")) + " 30", Commands + "bt\nbt -2\nframe 22\n", false);
+  EXPECT_EQ(Run.ExitCode, 0) << Run.Stderr;
+  const std::string Frame = R"(0x[0-9a-f]{16} in recurse \(left=[0-9]+\) at deep\.c:[0-9]+)";
+  EXPECT_TRUE(std::regex_search(Run.Stdout, std::regex("\n  #1  " + Frame + "\n"))) << Run.Stdout;
+  EXPECT_TRUE(std::regex_search(Run.Stdout, std::regex("\n  #19  " + Frame + "\n\\([0-9]+ more frames; ")))
+      << Run.Stdout;
+  const std::regex Main(R"(\n  #[0-9]+  0x[0-9a-f]{16} in main \(argc=2, argv=0x[0-9a-f]+\) at deep\.c:11\n)");
+  EXPECT_TRUE(std::regex_search(Run.Stdout, Main)) << Run.Stdout;
+  EXPECT_TRUE(std::regex_search(Run.Stdout, std::regex("\n#22  " + Frame + "\n"))) << Run.Stdout;
 }
 
 } // namespace

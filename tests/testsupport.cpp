@@ -48,14 +48,15 @@ bool ReadStat(int Pid, std::string& Name, char& State, int& Parent) {
 
 } // namespace
 
-std::vector<int> ChildrenNamed(const std::string& Name) {
+std::vector<int> ChildrenNamed(const std::string& Name, int Parent) {
+  const int Wanted = Parent == 0 ? getpid() : Parent;
   std::vector<int> Found;
   for (const auto& Entry : std::filesystem::directory_iterator("/proc")) {
     const int Pid = std::atoi(Entry.path().filename().c_str());
     std::string Command;
     char State = 0;
-    int Parent = 0;
-    if (Pid > 0 && ReadStat(Pid, Command, State, Parent) && Parent == getpid() && Command == Name && State != 'Z')
+    int Owner = 0;
+    if (Pid > 0 && ReadStat(Pid, Command, State, Owner) && Owner == Wanted && Command == Name && State != 'Z')
       Found.push_back(Pid);
   }
   return Found;

@@ -38,8 +38,9 @@ std::string DebuggeeSource(const std::string& FileName);
 /// runs here; empty, with the reason for a skip in WhyNot, when it does not.
 std::string LLDBMIPath(std::string& WhyNot);
 
-/// Living child processes of this test program with the given name.
-std::vector<int> ChildrenNamed(const std::string& Name);
+/// Living child processes with the given name of Parent (0: of this test
+/// program).
+std::vector<int> ChildrenNamed(const std::string& Name, int Parent = 0);
 
 /// Whether Pid names a process that has not ended (a zombie has ended).
 bool ProcessRuns(int Pid);

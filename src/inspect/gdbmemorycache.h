@@ -18,8 +18,9 @@ class TGDBDisassemble;
 
 /// Reads inside the last disassembled range are answered from here. FLock
 /// guards both caches and is a leaf, held while they are read or replaced,
-/// never during a request to the debugger; the cursor's own lock is a leaf
-/// too and is never held together with FLock.
+/// never during a request to the debugger. FCursorLock guards FDisassembler;
+/// the cursor's own lock is taken inside it only when the cursor is cut
+/// loose, and neither is ever held together with FLock.
 class TGDBMemoryCache {
 public:
   explicit TGDBMemoryCache(TGDBProcess& Process);

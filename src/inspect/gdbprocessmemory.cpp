@@ -4,6 +4,7 @@
 #include "inspect/gdbmemorycache.h"
 #include "process/gdbprocess.h"
 
+#include <algorithm>
 #include <cstring>
 
 namespace midebug {
@@ -181,6 +182,15 @@ void TGDBProcess::DisassembleAt(UInt64 Address, Integer& Size, std::string& Text
   TGDBDisassembleData Data;
   FMemory->DisassembleAt(Address, Size, Data);
   Text = Size != -1 ? Data.AsmData : std::string();
+}
+
+UInt64 TGDBProcess::GetFunctionStart(UInt64 Address) {
+  TGDBDisassembleData Data;
+  Integer Size = -1;
+  FMemory->DisassembleAt(Address, Size, Data);
+  if (Size == -1 || Data.FunctionOffset < 0 || Address - Data.Address >= static_cast<UInt64>(std::max(Size, 1)))
+    return 0;
+  return Data.Address - static_cast<UInt64>(Data.FunctionOffset);
 }
 
 } // namespace midebug

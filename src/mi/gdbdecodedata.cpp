@@ -41,6 +41,7 @@ void ReadInstructions(TMIScanner& Scanner, std::string_view List, TGDBDisassembl
     Instruction.Address = Scanner.FindUInt64("address", 0);
     Instruction.Size = ReadInstructionSize(Scanner);
     Instruction.AsmData = std::string(Scanner.FindValue("inst"));
+    Instruction.FunctionOffset = Scanner.FindInteger("offset", -1);
     // Only the first instruction of a source line carries its file and line.
     Instruction.Source = std::move(File);
     Instruction.Line = Line;

@@ -90,6 +90,8 @@ struct TGDBDisassembleData {
   std::string AsmData;
   Integer Line = 0;
   std::string Source;
+  /// Bytes from the start of the function holding it; -1 when not told.
+  Integer FunctionOffset = -1;
 };
 
 using TStackFrameArray = std::vector<TGDBStackFrame>;

@@ -233,6 +233,11 @@ public:
   virtual Integer GetPid() = 0;
   virtual UInt64 GetBaseAddress() = 0;
   virtual TGDBModule GetModule(Integer Id) = 0;
+
+  // Added after the operations above.
+  /// The start of the function that holds Address, as its disassembly
+  /// tells; 0 when unknown.
+  virtual UInt64 GetFunctionStart(UInt64 Address) = 0;
 };
 
 } // namespace midebug

@@ -134,6 +134,7 @@ public:
   Integer GetPid() override;
   UInt64 GetBaseAddress() override { return FBaseAddress; }
   TGDBModule GetModule(Integer Id) override { return FModules.Current(Id); }
+  UInt64 GetFunctionStart(UInt64 Address) override;
   bool CanSetRunToMainBreakpoint() const { return FBreakOnMain != nullptr; } ///< run-to-main breakpoint placed
   TGDBThreadTable& Threads() { return *FThreads; }
   TGDBRegisterIds& Registers() { return *FRegisters; }
@@ -166,8 +167,7 @@ private:
   /// Stops a synchronous target that the IDE does not hear of; true when
   /// this call paused it; Aborted when the pause failed or one was running.
   bool SyncTargetPause(bool& Aborted, bool FatalOnExpiry);
-  /// Resumes an asynchronous target paused inside the process, unheard.
-  void ASyncTargetResume();
+  void ASyncTargetResume(); ///< resumes an asynchronous target paused inside the process, unheard
   TGDBLanguage GetCurrentLanguage();
   /// A signal (tsrSignal) or language exception (tsrExceptRaised) stopped
   /// the program: an Expected one is a plain stop, else the IDE decides.

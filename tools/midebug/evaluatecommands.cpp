@@ -96,9 +96,9 @@ void TCliSession::CmdPrint(const std::string& Name, const std::vector<std::strin
 }
 
 void TCliSession::CmdSetVar(const std::string& Name, const std::vector<std::string>& Arguments) {
-  const std::string Text = Joined(Arguments, 1);
+  const std::string Text = Joined(Arguments, 0);
   const size_t Assignment = AssignmentAt(Text);
-  if (Arguments.empty() || Arguments[0] != "var" || Assignment == std::string::npos) {
+  if (Assignment == std::string::npos) {
     FOutput.Error(Name, "usage: set var EXPRESSION = VALUE");
     return;
   }
@@ -126,12 +126,8 @@ void TCliSession::CmdSetVar(const std::string& Name, const std::vector<std::stri
   FOutput.Emit({{"answer", "set var"}, {"expression", Expr}, {"value", Value}}, Expr + " = " + Value);
 }
 
-void TCliSession::CmdInfoValues(const std::string& Name, const std::vector<std::string>& Arguments) {
-  if (Arguments.size() != 1 || (Arguments[0] != "locals" && Arguments[0] != "args")) {
-    FOutput.Error(Name, "usage: info locals|args");
-    return;
-  }
-  const std::string Answer = Name + " " + Arguments[0];
+void TCliSession::CmdInfoValues(const std::string& Name, const std::vector<std::string>& /*Arguments*/) {
+  const std::string& Answer = Name;
   if (!RequireStopped(Answer))
     return;
   const TIntfPtr<IGDBThread> Thread = CurrentThread(Answer);
@@ -146,7 +142,7 @@ void TCliSession::CmdInfoValues(const std::string& Name, const std::vector<std::
   const Integer Count = Locals->GetMemberCount();
   const Integer Arguments0 =
       std::min(static_cast<Integer>(ArgumentCount(Thread->GetCallHeader(FCurrentFrame + 1))), Count);
-  const bool WantArguments = Arguments[0] == "args";
+  const bool WantArguments = Name == "info args";
   nlohmann::json Variables = nlohmann::json::array();
   std::string Text;
   for (Integer Index = WantArguments ? 0 : Arguments0; Index < (WantArguments ? Arguments0 : Count); ++Index) {

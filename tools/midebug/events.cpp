@@ -3,6 +3,7 @@
 #include "session.h"
 
 #include <regex>
+#include <utility>
 
 namespace midebug::cli {
 
@@ -138,6 +139,10 @@ std::string SignalWords(const std::string& Name, const std::string& Description)
   return Words.empty() ? Name : Name + " (" + Words + ")";
 }
 
+/// The code the library gives the end of a launch the debugger refused;
+/// the loss of the debugger comes with another.
+constexpr Integer LaunchRefusedCode = -1;
+
 /// A signal's name is a single word in capitals; the library reports other
 /// texts (the debugger's loss, a refused launch) in the same place.
 bool IsSignalName(const std::string& Text) {
@@ -161,7 +166,8 @@ void TCliSession::OnSuspended(Integer ThreadId) {
     if (TIntfPtr<IGDBThread> Thread = FProcess->GetThread(ThreadId)) {
       Reason = Thread->GetStopReason();
       Location = Thread->GetCurrentLocation();
-      if (Thread->GetCallCount() > 0)
+      // The frame's call is read only for the text a person reads.
+      if (!FOutput.Json() && Thread->GetCallCount() > 0)
         Header = Thread->GetCallHeader(1);
     }
     if (Location.Source.empty() && Location.Address == 0)
@@ -178,6 +184,9 @@ void TCliSession::OnSuspended(Integer ThreadId) {
     Why = "Stopped by signal " + SignalWords(FLastSignal.Name, FLastSignal.Desc);
   }
   FPausing = false;
+  FAwaitingMain = false;
+  FPauseWhenResumed = false;
+  FResumeConfirmed = true;
   FLastSignal = {};
   Event["reason"] = ReasonWord;
   Event.update(LocationJson(Location));
@@ -194,6 +203,9 @@ void TCliSession::OnSuspended(Integer ThreadId) {
 
 void TCliSession::OnResumed(Integer ThreadId) {
   FState = TRunState::Running;
+  FResumeConfirmed = true;
+  if (std::exchange(FPauseWhenResumed, false))
+    RequestPause();
   FOutput.Emit({{"event", "running"}, {"thread", ThreadId}}, "");
 }
 
@@ -218,7 +230,7 @@ void TCliSession::OnExited(Integer Code, const std::string& Signal) {
     Event["reason"] = "signal";
     Event["signal"] = Signal;
     Text = "Program ended by signal " + SignalWords(Signal, "") + ".";
-  } else if (!Signal.empty() && Before == TRunState::Loaded) {
+  } else if (!Signal.empty() && Before == TRunState::Loaded && Code == LaunchRefusedCode) {
     FState = TRunState::Exited;
     Event["reason"] = "start-failed";
     Event["message"] = Signal;
@@ -233,6 +245,10 @@ void TCliSession::OnExited(Integer Code, const std::string& Signal) {
     Event["reason"] = "exited";
     Event["code"] = Code;
     Text = "Program exited with code " + std::to_string(Code) + ".";
+  }
+  if (std::exchange(FAwaitingMain, false) && Ending == TEnding::None) {
+    Event["note"] = "no main function";
+    Text += " It never reached main: the program has no main function.";
   }
   FOutput.Emit(Event, Text);
 }

@@ -6,6 +6,7 @@
 #include <cstdlib>
 #include <filesystem>
 #include <sstream>
+#include <string_view>
 
 namespace midebug::cli {
 
@@ -91,12 +92,20 @@ const std::vector<TCliSession::TCommandEntry>& TCliSession::Commands() {
       {"detach", &TCliSession::CmdDetach, 0, "detach", "let the program go on without the debugger"},
       {"quit", &TCliSession::CmdQuit, 0, "quit",
        "end the session (a launched program is killed, an attached one detached)"},
+      {"x", &TCliSession::CmdExamine, 2, "x ADDRESS [COUNT]", "COUNT bytes of memory at ADDRESS (64), in hex and text"},
+      {"write", &TCliSession::CmdWrite, 2, "write ADDRESS HEXBYTES", "write bytes (\"90c3\") to memory at ADDRESS"},
+      {"disassemble", &TCliSession::CmdDisassemble, 2, "disassemble [ADDRESS] [COUNT]",
+       "COUNT instructions (20) from ADDRESS, by default from the start of the current function"},
+      {"info registers", &TCliSession::CmdInfoRegisters, 1, "info registers [general|fpu|sse|NAME]",
+       "the registers of the current thread"},
+      {"set register", &TCliSession::CmdSetRegister, 2, "set register NAME VALUE", "write a register"},
       {"print", &TCliSession::CmdPrint, AnyArguments, "print[/x|/d|/c] EXPRESSION", "the value of an expression"},
       {"print/x", &TCliSession::CmdPrint, AnyArguments, "print/x EXPRESSION", "the value in hexadecimal"},
       {"print/d", &TCliSession::CmdPrint, AnyArguments, "print/d EXPRESSION", "the value in decimal"},
       {"print/c", &TCliSession::CmdPrint, AnyArguments, "print/c EXPRESSION", "the value as a character"},
-      {"set", &TCliSession::CmdSetVar, AnyArguments, "set var EXPRESSION = VALUE", "assign a value to a variable"},
-      {"info", &TCliSession::CmdInfoValues, 1, "info locals|args", "the current frame's locals or arguments"},
+      {"set var", &TCliSession::CmdSetVar, AnyArguments, "set var EXPRESSION = VALUE", "assign a value to a variable"},
+      {"info locals", &TCliSession::CmdInfoValues, 0, "info locals", "the current frame's local variables"},
+      {"info args", &TCliSession::CmdInfoValues, 0, "info args", "the current frame's arguments"},
       {"inspect", &TCliSession::CmdInspect, AnyArguments, "inspect EXPRESSION [FROM COUNT]",
        "a value's children, one level"},
       {"display", &TCliSession::CmdDisplay, AnyArguments, "display EXPRESSION", "print an expression at every stop"},
@@ -188,18 +197,24 @@ bool TCliSession::Execute(const std::string& Line) {
   const std::string Name = Words.front();
   Words.erase(Words.begin());
   for (const TCommandEntry& Entry : Commands()) {
-    if (Name != Entry.Name)
+    // A command of two words ("info registers") takes the second as well.
+    const std::string_view EntryName = Entry.Name;
+    const size_t Blank = EntryName.find(' ');
+    if (EntryName.substr(0, Blank) != Name ||
+        (Blank != std::string_view::npos && (Words.empty() || EntryName.substr(Blank + 1) != Words.front())))
       continue;
+    if (Blank != std::string_view::npos)
+      Words.erase(Words.begin());
     if (Words.size() > Entry.MaxArguments) {
-      FOutput.Error(Name, Entry.MaxArguments == 0 ? "'" + Name + "' takes no arguments"
-                                                  : "usage: " + std::string(Entry.Usage));
+      FOutput.Error(Entry.Name, Entry.MaxArguments == 0 ? "'" + std::string(Entry.Name) + "' takes no arguments"
+                                                        : "usage: " + std::string(Entry.Usage));
       return true;
     }
     try {
-      (this->*Entry.Handler)(Name, Words);
+      (this->*Entry.Handler)(Entry.Name, Words);
     } catch (const std::exception& Error) {
       // The library raises at its boundary when the debugger fails.
-      FOutput.Error(Name, Error.what());
+      FOutput.Error(Entry.Name, Error.what());
     }
     return !FQuit;
   }
@@ -227,6 +242,13 @@ void TCliSession::End() {
 }
 
 bool TCliSession::EndProgram(TEnding How) {
+  // Both pause the program first, which the library skips while it still
+  // counts the program as stopped: the resume must be under way.
+  const auto Deadline = std::chrono::steady_clock::now() + EndWait;
+  while (FState == TRunState::Running && !FResumeConfirmed && std::chrono::steady_clock::now() < Deadline)
+    WaitAndProcess(PumpSlice);
+  if (FState != TRunState::Running && FState != TRunState::Stopped)
+    return true;
   const uint64_t Before = FStopCount;
   FEnding = How;
   if (How == TEnding::Detach)
@@ -260,6 +282,9 @@ bool TCliSession::HandleSignals() {
 
 void TCliSession::RequestPause() {
   FPausing = true;
+  // The library ignores a pause until the debugger has said the program
+  // runs: one asked for sooner is asked again then.
+  FPauseWhenResumed = !FResumeConfirmed;
   try {
     FProcess->Pause();
   } catch (const std::exception& Error) {
@@ -340,6 +365,10 @@ void TCliSession::ResumeAndWait(const std::string& Name, const std::function<voi
   // Counted before resuming, so that a stop reported during the resuming
   // call itself is not missed.
   const uint64_t Before = FStopCount;
+  // The library counts a program it saw stopped as stopped until the
+  // debugger reports it running again; a launch it never counted so.
+  if (FState == TRunState::Stopped)
+    FResumeConfirmed = false;
   Resume();
   if (!FWaitForStops) {
     // The prompt comes back at once; the stop is printed when it comes.
@@ -424,6 +453,9 @@ void TCliSession::CmdStart(const std::string& Name, const std::vector<std::strin
     FOutput.Error(Name, "the program has no main function; 'run' runs it");
     return;
   }
+  // The debugger accepts a breakpoint on a main it has not found yet, in
+  // case a library brings one: an end before any stop means there was none.
+  FAwaitingMain = true;
   ResumeAndWait(Name, [this] { FProcess->Run(); });
 }
 
@@ -628,6 +660,8 @@ void TCliSession::CmdHelp(const std::string& Name, const std::vector<std::string
     Usage.resize(std::max<size_t>(Usage.size(), 10), ' ');
     Text += "  " + Usage + "  " + Entry.Help + "\n";
   }
+  Text += "While the program runs: pause (or Ctrl-C), kill, detach, threads, quit.\n"
+          "The program's input is empty unless midebug was started with --stdin FILE or --tty DEVICE.\n";
   FOutput.Emit({{"answer", Name}, {"commands", List}}, Text);
 }
 

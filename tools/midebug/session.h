@@ -112,6 +112,13 @@ private:
   void CmdQuit(const std::string& Name, const std::vector<std::string>& Arguments);
   void CmdHelp(const std::string& Name, const std::vector<std::string>& Arguments);
 
+  // --- Memory, disassembly and registers (memorycommands.cpp) -------------
+  void CmdExamine(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdWrite(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdDisassemble(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdInfoRegisters(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdSetRegister(const std::string& Name, const std::vector<std::string>& Arguments);
+  // --- End of memory, disassembly and registers ----------------------------
   // --- Values (evaluatecommands.cpp) -------------------------------------
   /// An expression takes any number of words.
   static constexpr size_t AnyArguments = SIZE_MAX;
@@ -184,6 +191,12 @@ private:
   bool FWaitForStops = true;
   /// Set by a pause the session asked for, until the stop it brings.
   bool FPausing = false;
+  /// Set by 'start' until the program first stops.
+  bool FAwaitingMain = false;
+  /// Whether the library has reported the program running since the last
+  /// resume, and a pause waits for that.
+  bool FResumeConfirmed = true;
+  bool FPauseWhenResumed = false;
   /// The end the session itself asked for, so that it is reported as such.
   TEnding FEnding = TEnding::None;
   /// The last signal reported, for the stop it brings.

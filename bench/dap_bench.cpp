@@ -1,0 +1,243 @@
+// The debug adapter against GDB driven straight over pipes, interleaved on
+// the same program: (a) from starting the adapter (or GDB) to the first stop
+// at main; (b) 200 times a step over a line, its stop and a stack trace of
+// 20 frames. Each is measured in 5 rounds; the medians and their ratios are
+// printed.
+
+#include "benchsupport.h"
+#include "dapframing.h"
+#include "midebug.h"
+#include "platform/hostprocess.h"
+
+#include <nlohmann/json.hpp>
+
+#include <algorithm>
+#include <chrono>
+#include <cstdio>
+#include <cstdlib>
+#include <filesystem>
+#include <fstream>
+#include <functional>
+#include <string>
+#include <vector>
+
+namespace midebug {
+namespace {
+
+using TClock = std::chrono::steady_clock;
+using TMilliseconds = std::chrono::duration<double, std::milli>;
+
+constexpr int Rounds = 5;
+constexpr int StepsPerRound = 200;
+constexpr int TraceLevels = 20;
+
+/// 20 calls deep, a long loop to step through.
+constexpr const char* SteppedProgram = R"(static void spin(void) {
+  volatile long total = 0;
+  for (long i = 0; i < 100000000; ++i) {
+    total += i;
+  }
+}
+static void descend(int left) {
+  if (left == 0) {
+    spin();
+    return;
+  }
+  descend(left - 1);
+}
+int main(void) {
+  descend(18);
+  return 0;
+}
+)";
+
+std::string BuildSteppedProgram() {
+  const std::filesystem::path Dir = std::filesystem::temp_directory_path() / "midebug-dap-bench";
+  std::filesystem::create_directories(Dir);
+  std::ofstream(Dir / "stepped.c") << SteppedProgram;
+  const std::string Program = (Dir / "stepped").string();
+  const std::string Command = "gcc -g -O0 -o '" + Program + "' '" + (Dir / "stepped.c").string() + "'";
+  return std::system(Command.c_str()) == 0 ? Program : std::string();
+}
+
+/// A client of the adapter on two pipes, reading with blocking reads.
+class TDapClient {
+public:
+  TDapClient() = default;
+  TDapClient(const TDapClient&) = delete;
+  TDapClient& operator=(const TDapClient&) = delete;
+  ~TDapClient() {
+    if (FPid == -1)
+      return;
+    FStdIn.CloseWrite();
+    KillProcess(FPid);
+    ReapChildProcess(FPid);
+  }
+
+  bool Start() {
+    TChildProcess Child;
+    std::string Error;
+    if (!StartChildProcess({MIDEBUG_DAP}, {}, FStdIn.ReadHandle(), FStdOut.WriteHandle(), Child, Error))
+      return false;
+    FPid = Child.Pid;
+    FStdIn.CloseRead();
+    FStdOut.CloseWrite();
+    return true;
+  }
+  /// Sends a request; the seq it went under.
+  int Send(const std::string& Command, const nlohmann::json& Arguments = nlohmann::json::object()) {
+    const std::string Body =
+        nlohmann::json{{"seq", ++FSeq}, {"type", "request"}, {"command", Command}, {"arguments", Arguments}}.dump();
+    const std::string Framed = dap::FrameMessage(Body);
+    WriteHandle(FStdIn.WriteHandle(), Framed.data(), Framed.size());
+    return FSeq;
+  }
+  /// Reads messages until Wanted accepts one, which it returns; null when
+  /// the adapter ended.
+  nlohmann::json Await(const std::function<bool(const nlohmann::json&)>& Wanted) {
+    for (;;) {
+      std::string Body;
+      while (FReader.Next(Body) == dap::TDapFrameReader::TNext::Message) {
+        nlohmann::json Message = nlohmann::json::parse(Body, nullptr, false);
+        if (Wanted(Message))
+          return Message;
+      }
+      char Buffer[65536];
+      const Int64 Read = ReadHandle(FStdOut.ReadHandle(), Buffer, sizeof Buffer);
+      if (Read <= 0)
+        return nullptr;
+      FReader.Feed(std::string_view(Buffer, static_cast<size_t>(Read)));
+    }
+  }
+  nlohmann::json Response(int Seq) {
+    return Await([Seq](const nlohmann::json& M) { return M.value("request_seq", -1) == Seq; });
+  }
+  nlohmann::json Event(const std::string& Name) {
+    return Await([&Name](const nlohmann::json& M) { return M.value("event", "") == Name; });
+  }
+
+private:
+  TPipe FStdIn;
+  TPipe FStdOut;
+  Integer FPid = -1;
+  int FSeq = 0;
+  dap::TDapFrameReader FReader;
+};
+
+/// The adapter from its start to the stop at main; false when it failed.
+bool AdapterToMain(TDapClient& Client, const std::string& Program, int& ThreadId) {
+  if (!Client.Start())
+    return false;
+  Client.Response(Client.Send("initialize", {{"adapterID", "bench"}}));
+  Client.Event("initialized");
+  const int Launch = Client.Send("launch", {{"program", Program}, {"stopAtEntry", true}});
+  Client.Send("configurationDone");
+  if (!Client.Response(Launch).value("success", false))
+    return false;
+  const nlohmann::json Stopped = Client.Event("stopped");
+  if (Stopped.is_null())
+    return false;
+  ThreadId = Stopped["body"].value("threadId", 1);
+  return true;
+}
+
+bool RawToMain(bench::TRawGdbPipes& Raw, const std::string& Program) {
+  return Raw.Start() && Raw.StartProgram(Program, "main");
+}
+
+double Median(std::vector<double> Values) {
+  std::sort(Values.begin(), Values.end());
+  return Values[Values.size() / 2];
+}
+
+int Run() {
+  SetMainThread();
+  const std::string Program = BuildSteppedProgram();
+  if (Program.empty()) {
+    std::fprintf(stderr, "dap_bench: cannot build the stepped program\n");
+    return 1;
+  }
+  // (a) Start-up, interleaved.
+  std::vector<double> AdapterStart, RawStart;
+  for (int Round = 0; Round < Rounds; ++Round) {
+    TClock::time_point Begin = TClock::now();
+    {
+      TDapClient Client;
+      int ThreadId = 0;
+      if (!AdapterToMain(Client, Program, ThreadId)) {
+        std::fprintf(stderr, "dap_bench: the adapter did not stop at main\n");
+        return 1;
+      }
+      AdapterStart.push_back(TMilliseconds(TClock::now() - Begin).count());
+    }
+    Begin = TClock::now();
+    {
+      bench::TRawGdbPipes Raw;
+      if (!RawToMain(Raw, Program)) {
+        std::fprintf(stderr, "dap_bench: GDB did not stop at main\n");
+        return 1;
+      }
+      RawStart.push_back(TMilliseconds(TClock::now() - Begin).count());
+    }
+  }
+
+  // (b) Steps, both sessions stopped in the loop 20 frames deep.
+  TDapClient Client;
+  bench::TRawGdbPipes Raw;
+  int ThreadId = 0;
+  if (!AdapterToMain(Client, Program, ThreadId) || !RawToMain(Raw, Program) || !Raw.Request("-break-insert -t spin") ||
+      !Raw.Request("-exec-continue", "*stopped")) {
+    std::fprintf(stderr, "dap_bench: cannot reach the loop\n");
+    return 1;
+  }
+  for (int Step = 0; Step < 40; ++Step) {
+    Client.Send("stepIn", {{"threadId", ThreadId}});
+    Client.Event("stopped");
+    const nlohmann::json Trace = Client.Response(Client.Send("stackTrace", {{"threadId", ThreadId}, {"levels", 1}}));
+    if (Trace["body"]["stackFrames"][0].value("name", "").starts_with("spin"))
+      break;
+  }
+  std::vector<double> AdapterSteps, RawSteps;
+  for (int Round = 0; Round < Rounds; ++Round) {
+    TClock::duration AdapterTime{}, RawTime{};
+    for (int Step = 0; Step < StepsPerRound; ++Step) {
+      TClock::time_point Begin = TClock::now();
+      Client.Send("next", {{"threadId", ThreadId}});
+      Client.Event("stopped");
+      const nlohmann::json Trace =
+          Client.Response(Client.Send("stackTrace", {{"threadId", ThreadId}, {"startFrame", 0}, {"levels", TraceLevels}}));
+      if (Trace.is_null() || Trace["body"]["stackFrames"].size() != TraceLevels) {
+        std::fprintf(stderr, "dap_bench: a stack trace came short\n");
+        return 1;
+      }
+      AdapterTime += TClock::now() - Begin;
+      Begin = TClock::now();
+      // The same MI the adapter's step and stack trace cost, as the
+      // debugger's log shows.
+      if (!Raw.Request("-exec-next", "*stopped") || !Raw.Request("-interpreter-exec console \"show language\"") ||
+          !Raw.Request("-thread-info") || !Raw.Request("-stack-info-depth 50001") ||
+          !Raw.Request("-stack-list-frames 0 31") || !Raw.Request("-stack-list-arguments 1 0 31")) {
+        std::fprintf(stderr, "dap_bench: GDB did not step\n");
+        return 1;
+      }
+      RawTime += TClock::now() - Begin;
+    }
+    AdapterSteps.push_back(TMilliseconds(AdapterTime).count());
+    RawSteps.push_back(TMilliseconds(RawTime).count());
+  }
+  Client.Response(Client.Send("disconnect"));
+
+  const double A = Median(AdapterStart), AR = Median(RawStart);
+  const double B = Median(AdapterSteps), BR = Median(RawSteps);
+  std::printf("(a) launch to the stop at main: adapter %.1f ms, GDB over pipes %.1f ms (median of %d)\n", A, AR, Rounds);
+  std::printf("(b) %d x (next, stopped, stackTrace of %d frames): adapter %.1f ms, GDB over pipes %.1f ms "
+              "(median of %d)\n", StepsPerRound, TraceLevels, B, BR, Rounds);
+  std::printf("ratio (a) adapter / GDB = %.3f\n", A / AR);
+  std::printf("ratio (b) adapter / GDB = %.3f\n", B / BR);
+  return 0;
+}
+
+} // namespace
+} // namespace midebug
+
+int main() { return midebug::Run(); }

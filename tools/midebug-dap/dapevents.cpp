@@ -1,0 +1,221 @@
+// The library's events as the adapter reports them to the client.
+
+#include "dapsession.h"
+
+namespace midebug::dap {
+
+// --- The listener --------------------------------------------------------------
+
+void TDapListener::ProcessSuspended(Integer ThreadId) {
+  if (FSession)
+    FSession->OnSuspended(ThreadId);
+}
+void TDapListener::ProcessResumed(Integer ThreadId) {
+  if (FSession)
+    FSession->OnResumed(ThreadId);
+}
+void TDapListener::ProcessExited(Integer Code, const std::string& Signal) {
+  if (FSession)
+    FSession->OnExited(Code, Signal);
+}
+void TDapListener::ThreadCreated(Integer ThreadId) {
+  if (FSession)
+    FSession->OnThread(ThreadId, true);
+}
+void TDapListener::ThreadExited(Integer ThreadId) {
+  if (FSession)
+    FSession->OnThread(ThreadId, false);
+}
+void TDapListener::ModuleLoaded(const TGDBModule& Module) {
+  if (FSession)
+    FSession->OnModule(Module, true);
+}
+void TDapListener::ModuleUnLoaded(const TGDBModule& Module) {
+  if (FSession)
+    FSession->OnModule(Module, false);
+}
+void TDapListener::SignalReceived(bool& ShouldStop, Integer ThreadId, const TGDBException& SignalException) {
+  // Every signal stops the program, as GDB does by default: the client shows
+  // where it struck.
+  ShouldStop = true;
+  if (FSession)
+    FSession->OnSignal(ThreadId, SignalException);
+}
+void TDapListener::ExceptionRaised(bool& ShouldStop, Integer ThreadId, const TGDBException& LanguageException) {
+  ShouldStop = true;
+  if (FSession)
+    FSession->OnException(ThreadId, LanguageException);
+}
+void TDapListener::LogEvent(const TGDBLogEvent& Event) {
+  if (FSession)
+    FSession->OnLog(Event);
+}
+void TDapListener::InternalError(const std::string& Message) {
+  // Raised on the thread that found the error: reported from the main one,
+  // the only one that writes to the client.
+  TIntfPtr<TDapListener> Self(this);
+  Post([Self, Message] {
+    if (Self->FSession)
+      Self->FSession->OnLog(CreateInternalLogEvent("internal error: " + Message));
+  });
+}
+bool TDapListener::FatalError() {
+  // Nobody is there to wait for a debugger that stopped answering.
+  if (FSession)
+    FSession->OnDebuggerLost();
+  return true;
+}
+void TDapListener::ProcessRestart() {
+  TIntfPtr<TDapListener> Self(this);
+  Post([Self] {
+    if (Self->FSession)
+      Self->FSession->OnLog(CreateInternalLogEvent("the program restarts"));
+  });
+}
+
+// --- The session's side ------------------------------------------------------
+
+namespace {
+
+const char* StopReasonWord(TThreadStopReason Reason) {
+  switch (Reason) {
+  case tsrAtBreakpoint:
+    return "breakpoint";
+  case tsrStepDone:
+  case tsrFCallDone:
+    return "step";
+  case tsrSignal:
+    return "signal";
+  case tsrExceptRaised:
+    return "exception";
+  case tsrError:
+  case tsrNotStopped:
+  case tsrUnknown:
+  default:
+    return "pause";
+  }
+}
+
+/// "NAME (what it means)", or the part that is known.
+std::string Described(const std::string& Name, const std::string& Desc) {
+  if (Desc.empty())
+    return Name;
+  return Name.empty() ? Desc : Name + " (" + Desc + ")";
+}
+
+} // namespace
+
+bool TDapSession::ProgramGone() const {
+  return FState == TProgramState::Exited || FState == TProgramState::Detached || FState == TProgramState::Lost;
+}
+
+void TDapSession::OnSuspended(Integer ThreadId) {
+  // A report queued before the program's end arrives after it.
+  if (ProgramGone())
+    return;
+  FState = TProgramState::Stopped;
+  FThreads.insert(ThreadId);
+  if (FHoldAttachStop) {
+    // The stop that attaching caused: the client sees the program go on.
+    FAttachStopSeen = true;
+    StartWhenReady();
+    return;
+  }
+  nlohmann::json Body = {{"threadId", ThreadId}, {"allThreadsStopped", true}};
+  if (FEntryPending) {
+    Body["reason"] = "entry";
+  } else if (FPausePending) {
+    Body["reason"] = "pause";
+  } else if (FPendingStop) {
+    Body["reason"] = FPendingStop->first;
+    Body.update(FPendingStop->second);
+  } else {
+    TIntfPtr<IGDBThread> Thread = FProcess ? FProcess->GetThread(ThreadId) : nullptr;
+    Body["reason"] = StopReasonWord(Thread ? Thread->GetStopReason() : tsrUnknown);
+  }
+  FEntryPending = false;
+  FPausePending = false;
+  FPendingStop.reset();
+  SendEvent("stopped", std::move(Body));
+}
+
+void TDapSession::OnResumed(Integer ThreadId) {
+  if (ProgramGone())
+    return;
+  FState = TProgramState::Running;
+  FFrames.clear();
+  SendEvent("continued", {{"threadId", ThreadId}, {"allThreadsContinued", true}});
+}
+
+void TDapSession::OnExited(Integer Code, const std::string& Signal) {
+  FState = TProgramState::Exited;
+  if (!Signal.empty())
+    Output("console", "The program ended: " + Signal + "\n");
+  SendEvent("exited", {{"exitCode", Code}});
+  if (!FTerminatedSent) {
+    FTerminatedSent = true;
+    SendEvent("terminated");
+  }
+}
+
+void TDapSession::OnThread(Integer ThreadId, bool Started) {
+  if (Started)
+    FThreads.insert(ThreadId);
+  else
+    FThreads.erase(ThreadId);
+  SendEvent("thread", {{"reason", Started ? "started" : "exited"}, {"threadId", ThreadId}});
+}
+
+void TDapSession::OnModule(const TGDBModule& Module, bool Loaded) {
+  nlohmann::json Entry = {{"id", Module.Id}, {"name", Module.Name.empty() ? Module.Path : Module.Name}};
+  if (!Module.Path.empty())
+    Entry["path"] = Module.Path;
+  if (Module.BaseAddress != 0)
+    Entry["addressRange"] = "0x" + [&] {
+      static const char* const Digits = "0123456789abcdef";
+      std::string Hex;
+      for (UInt64 Value = Module.BaseAddress; Value != 0; Value >>= 4)
+        Hex.insert(Hex.begin(), Digits[Value & 0xF]);
+      return Hex;
+    }();
+  SendEvent("module", {{"reason", Loaded ? "new" : "removed"}, {"module", Entry}});
+}
+
+void TDapSession::OnSignal(Integer /*ThreadId*/, const TGDBException& Signal) {
+  FPendingStop.emplace("signal", nlohmann::json{{"description", "Signal " + Described(Signal.Name, Signal.Desc)},
+                                                {"text", Signal.Name}});
+}
+
+void TDapSession::OnException(Integer /*ThreadId*/, const TGDBException& Exception) {
+  std::string Description = Exception.Name;
+  if (!Exception.Desc.empty())
+    Description += (Description.empty() ? "" : ": ") + Exception.Desc;
+  FPendingStop.emplace("exception", nlohmann::json{{"description", "Exception " + Description},
+                                                   {"text", Exception.Name}});
+}
+
+void TDapSession::OnLog(const TGDBLogEvent& Event) {
+  if (Event.Data.empty())
+    return;
+  if (Event.Event == etUnknown) {
+    Output("stdout", Event.Data);
+    return;
+  }
+  // The debugger's own lines come with their line break turned to a blank.
+  std::string Text = Event.Data;
+  while (!Text.empty() && (Text.back() == ' ' || Text.back() == '\n'))
+    Text.pop_back();
+  Text += '\n';
+  Output("console", Text);
+}
+
+void TDapSession::OnDebuggerLost() {
+  FState = TProgramState::Lost;
+  Output("console", "midebug-dap: the debugger stopped answering; the session is over\n");
+  if (!FTerminatedSent) {
+    FTerminatedSent = true;
+    SendEvent("terminated");
+  }
+}
+
+} // namespace midebug::dap

@@ -1,0 +1,225 @@
+#pragma once
+/// \file
+/// One debug adapter session: the requests of one client, served on the
+/// main thread for one debugged program, and the library's events turned
+/// into the protocol's events.
+
+#include "dapterminal.h"
+#include "midebug.h"
+
+#include <nlohmann/json.hpp>
+
+#include <chrono>
+#include <optional>
+#include <set>
+#include <string>
+#include <utility>
+#include <vector>
+
+namespace midebug::dap {
+
+class TDapSession;
+
+/// The library's listener: hands every event to the session on the main
+/// thread (the two the library raises elsewhere are posted there first).
+class TDapListener : public TInterfaced<IGDBProcessListener> {
+public:
+  explicit TDapListener(TDapSession* Session) : FSession(Session) {}
+  /// Called by the session as it ends; events that come later are dropped.
+  void Forget() { FSession = nullptr; }
+
+  void ProcessSuspended(Integer ThreadId) override;
+  void ProcessResumed(Integer ThreadId) override;
+  void ProcessExited(Integer Code, const std::string& Signal) override;
+  void ThreadCreated(Integer ThreadId) override;
+  void ThreadExited(Integer ThreadId) override;
+  void ModuleLoaded(const TGDBModule& Module) override;
+  void ModuleUnLoaded(const TGDBModule& Module) override;
+  void SignalReceived(bool& ShouldStop, Integer ThreadId, const TGDBException& SignalException) override;
+  void ExceptionRaised(bool& ShouldStop, Integer ThreadId, const TGDBException& LanguageException) override;
+  void LogEvent(const TGDBLogEvent& Event) override;
+  void InternalError(const std::string& Message) override;
+  bool FatalError() override;
+  void ProcessRestart() override;
+
+private:
+  TDapSession* FSession;
+};
+
+/// The request's arguments, read with their types checked. The first
+/// argument of a wrong type is remembered as the request's problem.
+class TDapArguments {
+public:
+  explicit TDapArguments(const nlohmann::json& Arguments) : FArguments(Arguments) {}
+
+  std::optional<std::string> String(const char* Name);
+  std::optional<bool> Boolean(const char* Name);
+  /// A whole number within [Min, Max].
+  std::optional<long long> Number(const char* Name, long long Min, long long Max);
+  /// An object, as it is.
+  const nlohmann::json* Object(const char* Name);
+  /// A list of strings.
+  std::optional<TStringArray> Strings(const char* Name);
+  /// The first argument that had a wrong type or value; empty when none.
+  const std::string& Problem() const { return FProblem; }
+
+private:
+  const nlohmann::json* Find(const char* Name);
+  void Complain(const char* Name, const char* Expected);
+
+  const nlohmann::json& FArguments;
+  std::string FProblem;
+};
+
+/// What a handler answers: success with a body, or a failure a person can
+/// read.
+struct TDapReply {
+  bool Success = true;
+  std::string Message;
+  nlohmann::json Body;
+
+  static TDapReply Ok(nlohmann::json Body = nullptr) { return {true, {}, std::move(Body)}; }
+  static TDapReply Refuse(std::string Message) { return {false, std::move(Message), nullptr}; }
+};
+
+/// Where the debugged program is, as the session has learnt from events.
+enum class TProgramState { None, Loaded, Running, Stopped, Exited, Detached, Lost };
+
+/// The adapter's side of one client. Every member runs on the main thread:
+/// requests arrive there as deliveries from the reader, events from the
+/// library, and it alone writes to the client, so no state here is shared.
+class TDapSession {
+public:
+  TDapSession();
+  ~TDapSession();
+  TDapSession(const TDapSession&) = delete;
+  TDapSession& operator=(const TDapSession&) = delete;
+
+  /// One message body from the client.
+  void HandleMessage(const std::string& Body);
+  /// Bytes that were no message were dropped.
+  void HandleGarbage(const std::string& What);
+  /// The client closed its end: the program and the debugger go.
+  void HandleClientGone();
+  /// True once the session is over and the adapter may exit.
+  bool Finished() const { return FFinished; }
+  /// Ends the program if it still runs (a launched one) or lets it go (an
+  /// attached one), then the debugger.
+  void End(std::optional<bool> TerminateDebuggee = std::nullopt);
+
+  // Events, on the main thread.
+  void OnSuspended(Integer ThreadId);
+  void OnResumed(Integer ThreadId);
+  void OnExited(Integer Code, const std::string& Signal);
+  void OnThread(Integer ThreadId, bool Started);
+  void OnModule(const TGDBModule& Module, bool Loaded);
+  void OnSignal(Integer ThreadId, const TGDBException& Signal);
+  void OnException(Integer ThreadId, const TGDBException& Exception);
+  void OnLog(const TGDBLogEvent& Event);
+  void OnDebuggerLost();
+
+private:
+  using THandler = TDapReply (TDapSession::*)(TDapArguments& Arguments);
+  struct TRequestEntry {
+    const char* Command;
+    THandler Handler;
+  };
+  static const std::vector<TRequestEntry>& Requests();
+
+  TDapReply Initialize(TDapArguments& Arguments);
+  TDapReply Launch(TDapArguments& Arguments);
+  TDapReply Attach(TDapArguments& Arguments);
+  TDapReply ConfigurationDone(TDapArguments& Arguments);
+  TDapReply Disconnect(TDapArguments& Arguments);
+  TDapReply Terminate(TDapArguments& Arguments);
+  TDapReply Threads(TDapArguments& Arguments);
+  TDapReply StackTrace(TDapArguments& Arguments);
+  TDapReply Continue(TDapArguments& Arguments);
+  TDapReply Next(TDapArguments& Arguments);
+  TDapReply StepIn(TDapArguments& Arguments);
+  TDapReply StepOut(TDapArguments& Arguments);
+  TDapReply Pause(TDapArguments& Arguments);
+  TDapReply Cancel(TDapArguments& Arguments);
+  /// The requests whose library operations are still to come.
+  TDapReply NotYetServed(TDapArguments& Arguments);
+
+  /// A response to the adapter's own request.
+  void HandleResponse(const nlohmann::json& Response);
+  /// Runs the request's handler and answers it.
+  void Dispatch(const nlohmann::json& Request);
+  void Respond(const nlohmann::json& Request, const TDapReply& Reply);
+  void SendEvent(const std::string& Event, nlohmann::json Body = nullptr);
+  /// Sends Message with the next seq, which it returns.
+  Integer Send(nlohmann::json Message);
+  void Output(const std::string& Category, const std::string& Text);
+
+  /// The debugger's settings shared by launch and attach.
+  struct TDebuggerChoice {
+    std::string Debugger = "gdb";
+    TGDBLanguage Language = glC;
+  };
+  std::optional<TDapReply> ReadDebuggerChoice(TDapArguments& Arguments, const std::string& Program,
+                                              TDebuggerChoice& Choice);
+  /// Has the client start the program in its terminal through the stand-in,
+  /// and attaches to it there.
+  TDapReply LaunchInTerminal(const std::string& Program, const TStringArray& Arguments,
+                             const std::string& WorkingDir, const nlohmann::json& Environment,
+                             const TDebuggerChoice& Choice);
+  /// Starts the program once it is loaded and the client's configuration is
+  /// done, whichever comes last.
+  void StartWhenReady();
+  /// Null with Refusal set unless the program is stopped.
+  TIntfPtr<IGDBThread> StoppedThread(TDapArguments& Arguments, TDapReply& Refusal);
+  /// Why a request that needs a stopped program cannot be served now.
+  std::string NotStoppedReason() const;
+  /// Steps the thread the request names.
+  TDapReply Step(TDapArguments& Arguments, void (IGDBThread::*Line)(), void (IGDBThread::*Instruction)());
+  /// Pumps the main-thread queue while the program stays in State, at most
+  /// Limit.
+  void PumpWhile(TProgramState State, std::chrono::milliseconds Limit);
+  /// True once the program has exited, was let go or the debugger is lost.
+  bool ProgramGone() const;
+  Integer ClientLine(Integer Line) const { return FLinesStartAt1 ? Line : Line - 1; }
+  Integer FrameHandle(Integer ThreadId, Integer Level);
+
+  TIntfPtr<TDapListener> FListener;
+  TIntfPtr<IGDBProcess> FProcess;
+  TProgramState FState = TProgramState::None;
+  bool FAttached = false;
+  /// The client offers to start programs in its terminal.
+  bool FClientHasTerminal = false;
+  /// The program runs in the client's terminal (launched, though attached to).
+  bool FInTerminal = false;
+  TStandInMeeting FMeeting;
+  /// The seq of the adapter's runInTerminal request, and the client's answer.
+  Integer FTerminalRequest = -1;
+  std::optional<TDapReply> FTerminalAnswer;
+  /// The stop that attaching caused is kept from the client until the
+  /// configuration is done; set until then, and once it has been seen.
+  bool FHoldAttachStop = false;
+  bool FAttachStopSeen = false;
+  bool FInitialized = false;
+  bool FConfigured = false;
+  bool FStarted = false;
+  bool FStopAtEntry = false;
+  /// Set while the stop at the program's entry is awaited.
+  bool FEntryPending = false;
+  /// Set by a pause request until the stop it caused.
+  bool FPausePending = false;
+  /// What the last signal or exception said, for the stop that follows it.
+  std::optional<std::pair<std::string, nlohmann::json>> FPendingStop;
+  bool FLinesStartAt1 = true;
+  bool FColumnsStartAt1 = true;
+  bool FEnding = false;
+  bool FFinished = false;
+  bool FTerminatedSent = false;
+  /// Set by a garbage report until the next good message, so that a flood
+  /// of garbage is reported once.
+  bool FInGarbage = false;
+  Integer FSequence = 0;
+  std::set<Integer> FThreads;
+  /// Frame ids handed out since the last stop: thread and 0-based level.
+  std::vector<std::pair<Integer, Integer>> FFrames;
+};
+
+} // namespace midebug::dap
