@@ -103,13 +103,24 @@ const std::vector<TLineCase> VarObjectCases = {
     {"EvaluateNaturalNamesFormat", BUILD(CreateVarEvaluateExpressionCommand(T, "var1", true, dvfNatural)),
      ctVarEvaluateExpression, "-var-evaluate-expression -f natural \"var1\""},
     // GDB unwraps the c-string and evaluates the literal 'A'; "A" alone would
-    // be read as a variable named A.
+    // be read as a variable named A, and "1 + 2" as three arguments.
     {"AssignCharForGdbWrapsLiteral", BUILD(CreateVarAssignCommand(T, "var1", "char", "'A'", false)), ctVarAssign,
      "-var-assign var1 \"'A'\""},
     {"AssignQuoteCharForGdbEscapesIt", BUILD(CreateVarAssignCommand(T, "var1", "char", "'\"'", false)),
      ctVarAssign, "-var-assign var1 \"'\\\"'\""},
-    {"AssignLoneQuoteAsWritten", BUILD(CreateVarAssignCommand(T, "var1", "char", "'", false)), ctVarAssign,
+    {"AssignExpressionForGdbQuotedNameAndValue",
+     BUILD(CreateVarAssignCommand(T, "var1.std::a b", "int", "1 + \\2", false, true)), ctVarAssign,
+     "-var-assign \"var1.std::a b\" \"1 + \\\\2\""},
+    {"AssignForLLDBAsWritten", BUILD(CreateVarAssignCommand(T, "var1", "char", "'", true)), ctVarAssign,
      "-var-assign var1 '"},
+    {"ListChildrenWindowQuoted", BUILD(CreateVarListChildrenCommand(T, "var1.a b", 100, 200, true, pvfNoValues)),
+     ctVarListChildren, "-var-list-children \"var1.a b\" 100 200"},
+    {"DeleteQuoted", BUILD(CreateVarDeleteCommand(T, "var1.a b", false, true)), ctVarDelete,
+     "-var-delete \"var1.a b\""},
+    {"UpdateQuoted", BUILD(CreateVarUpdateCommand(T, "var1", pvfAllValues, true)), ctVarUpdate,
+     "-var-update --all-values \"var1\""},
+    {"SetFormatQuoted", BUILD(CreateVarSetFormatCommand(T, "var1", dvfHex, true)), ctVarSetFormat,
+     "-var-set-format \"var1\" hexadecimal"},
 };
 INSTANTIATE_TEST_SUITE_P(CommandBuilderVarObjects, CommandLine, testing::ValuesIn(VarObjectCases), CaseName);
 
@@ -278,7 +289,7 @@ TEST(CommandBuilderExpressions, FixupExprPreparesExpressionArgument) {
       {"+$1F", "\"$1F\""},
       {"*0x1000", "*0x1000"},
       {"a\r\nb", "\"a  b\""},
-      {"s = \"x\"", "\"s = \"x\"\""},
+      {"$_streq(s, \"a\\\\b\")", "\"$_streq(s, \\\"a\\\\\\\\b\\\")\""},
   };
   for (const auto& Case : Cases)
     EXPECT_EQ(TGDBCommand::FixupExpr(Case.Expr), Case.Sent) << Case.Expr;

@@ -2,6 +2,7 @@
 // told when the program runs on or its modules change.
 
 #include "inspect/gdbbreakpointtable.h"
+#include "inspect/gdbevaluator.h"
 #include "inspect/gdbfiletable.h"
 #include "inspect/gdblinecache.h"
 #include "inspect/gdbmemorycache.h"
@@ -17,6 +18,7 @@ void TInspectDeleter::operator()(TGDBFileTable* Component) const { delete Compon
 void TInspectDeleter::operator()(TGDBLineCache* Component) const { delete Component; }
 void TInspectDeleter::operator()(TGDBMemoryCache* Component) const { delete Component; }
 void TInspectDeleter::operator()(TGDBRegisterIds* Component) const { delete Component; }
+void TInspectDeleter::operator()(TGDBEvaluator* Component) const { delete Component; }
 
 void TGDBProcess::MakeInspectComponents() {
   FThreads.reset(new TGDBThreadTable(*this));
@@ -25,6 +27,7 @@ void TGDBProcess::MakeInspectComponents() {
   FLines.reset(new TGDBLineCache);
   FMemory.reset(new TGDBMemoryCache(*this));
   FRegisters.reset(new TGDBRegisterIds(*this));
+  FEvaluator.reset(new TGDBEvaluator(*this, FEvaluating, FMaxChildrenCount));
 }
 
 Integer TGDBProcess::ForgetStop() {

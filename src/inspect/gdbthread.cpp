@@ -1,11 +1,14 @@
 #include "inspect/gdbthread.h"
 
+#include "inspect/gdbevaluator.h"
+#include "inspect/gdbinspect.h"
 #include "inspect/gdbregisterids.h"
 #include "inspect/gdbthreadtable.h"
 #include "process/gdbprocess.h"
 
 #include <algorithm>
 #include <cctype>
+#include <stdexcept>
 
 namespace midebug {
 
@@ -243,21 +246,62 @@ void TGDBThread::StepOut() { Step(&TGDBCommand::CreateExecFinishCommand); }
 void TGDBThread::InstStepInto() { Step(&TGDBCommand::CreateExecStepInstructionCommand); }
 void TGDBThread::InstStepOver() { Step(&TGDBCommand::CreateExecNextInstructionCommand); }
 
-// Evaluation and inspectors come with operations of their own; until then
-// they report failure.
-TGDBRetCode TGDBThread::Evaluate(const std::string&, const std::string&, Integer, std::string& Value, bool& CanModify,
-                                 std::string& TypeName) {
-  Value.clear();
-  CanModify = false;
-  TypeName.clear();
-  return ercError;
+TGDBRetCode TGDBThread::Evaluate(const std::string& Expr, const std::string& Suffix, Integer Frame,
+                                 std::string& Value, bool& CanModify, std::string& TypeName) {
+  if (!FProcess->Suspended() || !FProcess->Alive())
+    return TGDBEvaluator::EvaluateError(Value, CanModify, TypeName, NotSuspendedMessage);
+  SetAsSuspendedThread();
+  SelectFrame(Frame);
+  return FProcess->Evaluator().Evaluate(Expr, Suffix, 0, Value, CanModify, TypeName);
 }
-TGDBRetCode TGDBThread::Modify(const std::string&, std::string& Value) {
+
+TGDBRetCode TGDBThread::Modify(const std::string& NewValue, std::string& Value) {
   Value.clear();
-  return ercError;
+  if (!FProcess->Suspended() || !FProcess->Alive()) {
+    Value = NotSuspendedMessage;
+    return ercError;
+  }
+  return FProcess->Evaluator().Modify(NewValue, Value);
 }
+
 TIntfPtr<IGDBDisassemble> TGDBThread::GetDisassembler() { return FProcess->GetDisassembler(); }
-TIntfPtr<IGDBInspect> TGDBThread::CreateLocalVarsInspector(Integer) { return nullptr; }
-TIntfPtr<IGDBInspect> TGDBThread::CreateInspector(const std::string&, Integer) { return nullptr; }
+TIntfPtr<IGDBInspect> TGDBThread::CreateLocalVarsInspector(Integer Frame) {
+  if (!FProcess->Suspended() || !FProcess->Alive())
+    return new TGDBLocalInspect(*FProcess, nullptr, Frame, 0, 0, 0);
+  SetAsSuspendedThread();
+  SelectFrame(Frame);
+  const Integer Selected = FFrameIndex + 1;
+  return FProcess->Evaluator().CreateLocalVarsInspector(this, Selected, GetCallCount(), GetCallParams(Selected),
+                                                        nullptr);
+}
+
+TIntfPtr<IGDBInspect> TGDBThread::CreateInspector(const std::string& Expr, Integer Frame) {
+  if (!FProcess->Suspended() || !FProcess->Alive())
+    return new TGDBInspect(*FProcess, nullptr, Expr, 0);
+  SetAsSuspendedThread();
+  SelectFrame(Frame);
+  return new TGDBInspect(Expr, 0, *FProcess, this);
+}
+
+void TGDBThread::AddInspect(const std::string& Name, TGDBInspect* Inspect) {
+  if (Name.empty())
+    return;
+  std::lock_guard Guard(FInspectLock);
+  if (!FInspects.emplace(Name, Inspect).second)
+    throw std::logic_error("variable object " + Name + " is inspected already");
+}
+
+void TGDBThread::RemoveInspect(const std::string& Name) {
+  if (Name.empty())
+    return;
+  std::lock_guard Guard(FInspectLock);
+  FInspects.erase(Name);
+}
+
+TGDBInspect* TGDBThread::GetInspect(const std::string& Name) {
+  std::lock_guard Guard(FInspectLock);
+  const auto Found = FInspects.find(Name);
+  return Found == FInspects.end() ? nullptr : Found->second;
+}
 
 } // namespace midebug

@@ -7,11 +7,14 @@
 
 #include <functional>
 #include <map>
+#include <mutex>
 #include <string>
+#include <unordered_map>
 
 namespace midebug {
 
 class TGDBProcess;
+class TGDBInspect;
 
 /// A thread's identity, state and last stop. Every question that needs the
 /// debugger is routed to the owning process.
@@ -75,6 +78,13 @@ public:
   TIntfPtr<IGDBInspect> CreateLocalVarsInspector(Integer Frame) override;
   TIntfPtr<IGDBInspect> CreateInspector(const std::string& Expr, Integer Frame) override;
 
+  // --- The children of inspectors, by variable-object name, so that an
+  // update of their root reaches them. Not owned: each leaves on destruction.
+  /// Raises std::logic_error when Name is taken; nothing for an empty name.
+  void AddInspect(const std::string& Name, TGDBInspect* Inspect);
+  void RemoveInspect(const std::string& Name);
+  TGDBInspect* GetInspect(const std::string& Name);
+
   Integer FId;
   Integer FOsId;
   std::string FName;
@@ -97,6 +107,10 @@ public:
   TThreadStopReason FReason = tsrNotStopped;
 
 private:
+  /// Guards FInspects; a leaf lock.
+  std::mutex FInspectLock;
+  std::unordered_map<std::string, TGDBInspect*> FInspects;
+
   using TStepCreate = std::string (TGDBCommand::*)(std::string& Token);
   /// Makes this thread the debugger's current one and starts the step.
   void Step(TStepCreate Create);

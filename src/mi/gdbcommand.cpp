@@ -214,7 +214,7 @@ std::string TGDBCommand::FixupExpr(const std::string& Expr) {
   }
   if (Fixed.empty() || Fixed.front() == '*')
     return Fixed;
-  return "\"" + Fixed + "\"";
+  return DoubleQuoted(Fixed);
 }
 
 std::string TGDBCommand::Hex(UInt64 Address) const { return "0x" + UpperHex(Address, FAddressDigits); }
@@ -436,13 +436,14 @@ std::string TGDBCommand::CreateVarCreateCommand(std::string& Token, const std::s
   return CreateVarCreateCommand(Token, Name, "*" + Hex(Address), Frame);
 }
 
-std::string TGDBCommand::CreateVarDeleteCommand(std::string& Token, const std::string& Name, bool ChildrenOnly) {
-  return MiLine(Token, ctVarDelete, (ChildrenOnly ? " -c " : " ") + Name);
+std::string TGDBCommand::CreateVarDeleteCommand(std::string& Token, const std::string& Name, bool ChildrenOnly,
+                                                bool Quoted) {
+  return MiLine(Token, ctVarDelete, (ChildrenOnly ? " -c" : "") + NameArgument(Name, Quoted));
 }
 
 std::string TGDBCommand::CreateVarSetFormatCommand(std::string& Token, const std::string& Name,
-                                                   TDataValueFormat Format) {
-  return MiLine(Token, ctVarSetFormat, " " + Name + " " + std::string(DataValueFormatWord(Format)));
+                                                   TDataValueFormat Format, bool Quoted) {
+  return MiLine(Token, ctVarSetFormat, NameArgument(Name, Quoted) + " " + std::string(DataValueFormatWord(Format)));
 }
 
 std::string TGDBCommand::CreateVarInfoNumChildrenCommand(std::string& Token, const std::string& Name) {
@@ -468,6 +469,15 @@ std::string TGDBCommand::CreateVarListChildrenCommand(std::string& Token, const 
   return MiLine(Token, ctVarListChildren, Arguments);
 }
 
+std::string TGDBCommand::CreateVarListChildrenCommand(std::string& Token, const std::string& Name, Integer From,
+                                                      Integer To, bool Quoted, TPrintValuesFormat PrintValues) {
+  std::string Arguments;
+  if (PrintValues != pvfNoValues)
+    Arguments += " " + std::string(PrintValuesFormatWord(PrintValues));
+  Arguments += NameArgument(Name, Quoted) + " " + std::to_string(From) + " " + std::to_string(To);
+  return MiLine(Token, ctVarListChildren, Arguments);
+}
+
 std::string TGDBCommand::CreateVarInfoPathExpressionCommand(std::string& Token, const std::string& Name,
                                                             bool Quoted) {
   return MiLine(Token, ctVarInfoPathExpression, NameArgument(Name, Quoted));
@@ -486,23 +496,25 @@ std::string TGDBCommand::CreateVarEvaluateExpressionCommand(std::string& Token, 
 }
 
 std::string TGDBCommand::CreateVarAssignCommand(std::string& Token, const std::string& Name,
-                                                const std::string& TypeName, const std::string& Value,
-                                                bool IsLLDB) {
-  // GDB splits MI arguments at blanks, so ' ' would arrive as two arguments.
-  // Inside an MI c-string the literal survives with its quotes: GDB unwraps
-  // the c-string and evaluates 'x'. Without its single quotes it would read x
-  // as a variable name.
-  const bool IsCharLiteral = Value.size() >= 2 && Value.front() == '\'' && Value.back() == '\'';
-  const std::string Assigned = !IsLLDB && TypeName == "char" && IsCharLiteral ? DoubleQuoted(Value) : Value;
-  return MiLine(Token, ctVarAssign, " " + Name + " " + Assigned);
+                                                const std::string& /*TypeName*/, const std::string& Value,
+                                                bool IsLLDB, bool Quoted) {
+  // GDB splits MI arguments at blanks, so ' ' or 1 + 2 would arrive as
+  // several arguments. Inside an MI c-string the value survives whole: GDB
+  // unwraps the c-string and evaluates what the user wrote.
+  const std::string Assigned = IsLLDB ? Value : DoubleQuoted(Value);
+  return MiLine(Token, ctVarAssign, NameArgument(Name, Quoted) + " " + Assigned);
 }
 
 std::string TGDBCommand::CreateVarUpdateCommand(std::string& Token, const std::string& Name,
-                                                TPrintValuesFormat PrintValues) {
+                                                TPrintValuesFormat PrintValues, bool Quoted) {
   std::string Arguments;
   if (PrintValues != pvfNoValues)
     Arguments += " " + std::string(PrintValuesFormatWord(PrintValues));
-  return MiLine(Token, ctVarUpdate, Arguments + " " + Name);
+  return MiLine(Token, ctVarUpdate, Arguments + NameArgument(Name, Quoted));
+}
+
+std::string TGDBCommand::CreateEnablePrettyPrintingCommand(std::string& Token) {
+  return MiLine(Token, ctEnablePrettyPrinting, "");
 }
 
 // Disassembly, expressions, registers, memory

@@ -122,7 +122,8 @@ public:
   /// Prepares an expression argument: CR and LF become blanks, a leading "+"
   /// is dropped, a leading "$" of a hexadecimal number becomes "0x" (register
   /// names such as $eax stay), and the result is put in double quotes unless
-  /// it is empty or starts with "*". Inner double quotes are not escaped.
+  /// it is empty or starts with "*". Double quotes and backslashes inside
+  /// are escaped, so that a string literal reaches the debugger intact.
   static std::string FixupExpr(const std::string& Expr);
 
   // Breakpoints
@@ -203,25 +204,32 @@ public:
   /// A variable object for the memory at Address.
   std::string CreateVarCreateCommand(std::string& Token, const std::string& Name, UInt64 Address,
                                      UInt64 Frame);
-  std::string CreateVarDeleteCommand(std::string& Token, const std::string& Name, bool ChildrenOnly);
-  std::string CreateVarSetFormatCommand(std::string& Token, const std::string& Name, TDataValueFormat Format);
+  std::string CreateVarDeleteCommand(std::string& Token, const std::string& Name, bool ChildrenOnly,
+                                     bool Quoted = false);
+  std::string CreateVarSetFormatCommand(std::string& Token, const std::string& Name, TDataValueFormat Format,
+                                        bool Quoted = false);
   std::string CreateVarInfoNumChildrenCommand(std::string& Token, const std::string& Name);
   std::string CreateVarInfoTypeCommand(std::string& Token, const std::string& Name);
   std::string CreateVarInfoExpressionCommand(std::string& Token, const std::string& Name);
   /// Ranged asks for children 0 to 5000 only.
   std::string CreateVarListChildrenCommand(std::string& Token, const std::string& Name, bool Ranged,
                                            bool Quoted, TPrintValuesFormat PrintValues);
+  /// The children From to To - 1 only.
+  std::string CreateVarListChildrenCommand(std::string& Token, const std::string& Name, Integer From, Integer To,
+                                           bool Quoted, TPrintValuesFormat PrintValues);
   std::string CreateVarInfoPathExpressionCommand(std::string& Token, const std::string& Name, bool Quoted);
   std::string CreateVarShowAttributesCommand(std::string& Token, const std::string& Name, bool Quoted);
   /// dvfRaw writes no format option, leaving the object's own format.
   std::string CreateVarEvaluateExpressionCommand(std::string& Token, const std::string& Name, bool Quoted,
                                                  TDataValueFormat Format);
-  /// For GDB, a char literal ('x') of a "char" variable is sent inside an MI
-  /// c-string, so that a blank or quote character survives GDB's argument
-  /// splitting; LLDB gets Value as written.
+  /// For GDB the value is sent as an MI c-string, so that blanks, quotes and
+  /// backslashes survive GDB's argument splitting; LLDB gets Value as written.
   std::string CreateVarAssignCommand(std::string& Token, const std::string& Name, const std::string& TypeName,
-                                     const std::string& Value, bool IsLLDB);
-  std::string CreateVarUpdateCommand(std::string& Token, const std::string& Name, TPrintValuesFormat PrintValues);
+                                     const std::string& Value, bool IsLLDB, bool Quoted = false);
+  std::string CreateVarUpdateCommand(std::string& Token, const std::string& Name, TPrintValuesFormat PrintValues,
+                                     bool Quoted = false);
+  /// Lets pretty printers shape the values of variable objects made after it.
+  std::string CreateEnablePrettyPrintingCommand(std::string& Token);
 
   // Disassembly, expressions, registers, memory
   std::string CreateDataDisassembleCommand(std::string& Token, UInt64 StartAddr, UInt64 EndAddr, Integer Mode);

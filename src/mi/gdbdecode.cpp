@@ -379,11 +379,15 @@ bool DecodeSymbolListLines(TSymbolListLinesResult& Lines, TMIScanner& Scanner) {
 
 bool DecodeVarCreate(TVarCreateResult& Create, TMIScanner& Scanner) {
   Create.FName = Text(Scanner.FindValue("name"));
-  Create.FNumChild = ReadNumChild(Scanner);
+  // The whole count: the children are listed a window at a time.
+  Create.FNumChild = std::max(Scanner.FindInteger("numchild", 0), 0);
   Create.FType = Text(Scanner.FindValue("type"));
   Create.FValue = Text(Scanner.FindValue("value"));
   if (!Create.FValue.empty())
     Create.FValueDefined = true;
+  Create.FDynamic = Scanner.FindValue("dynamic") == "1";
+  Create.FHasMore = Scanner.FindInteger("has_more", 0) != 0;
+  Create.FDisplayHint = Text(Scanner.FindValue("displayhint"));
   return true;
 }
 
@@ -394,6 +398,7 @@ bool DecodeVarInfoNumChildren(TVarInfoNumChildrenResult& Info, TMIScanner& Scann
 
 bool DecodeVarListChildren(TVarListChildrenResult& List, TMIScanner& Scanner) {
   const Integer Count = ReadNumChild(Scanner);
+  List.FHasMore = Scanner.FindInteger("has_more", 0) != 0;
   if (Count <= 0)
     return true;
   std::string_view Children;
@@ -406,6 +411,7 @@ bool DecodeVarListChildren(TVarListChildrenResult& List, TMIScanner& Scanner) {
     Child.Expr = Text(Scanner.FindValue("exp"));
     Child.NumChild = ReadNumChild(Scanner);
     Child.VarType = Text(Scanner.FindValue("type"));
+    Child.Dynamic = Scanner.FindValue("dynamic") == "1";
   }
   return Present;
 }

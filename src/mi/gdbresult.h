@@ -78,6 +78,8 @@ struct TGDBVarChild {
   std::string Expr;
   Integer NumChild = 0;
   std::string VarType;
+  /// A pretty printer's object: its children are counted by listing them.
+  bool Dynamic = false;
 };
 
 struct TGDBDisassembleData {
@@ -335,6 +337,12 @@ public:
   bool FEditable = false;
   std::string FValue;
   bool FValueDefined = false;
+  /// A pretty printer's object: FNumChild is 0 and its children are counted
+  /// by listing them until FHasMore is false.
+  bool FDynamic = false;
+  bool FHasMore = false;
+  /// The printer's hint ("map", "array", "string"); empty without one.
+  std::string FDisplayHint;
 };
 
 class TVarEvaluateExpressionResult : public TGDBResult {
@@ -365,6 +373,8 @@ class TVarListChildrenResult : public TGDBResult {
 public:
   TVarListChildrenResult();
   TGDBVarChildArray FChildren;
+  /// Children remain past the window listed.
+  bool FHasMore = false;
 };
 
 class TVarInfoPathExpressionResult : public TGDBResult {

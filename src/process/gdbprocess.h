@@ -1,10 +1,9 @@
 #pragma once
 /// \file
-/// One debugged process: start-up, run control and the events it hands to
-/// the IDE's listener. Its state lives in components of one concern and one
-/// lock each: the request engine, pending events, module table and language
-/// query here, and the inspection components (inspectcomponents.h), whose
-/// operations are defined in src/inspect beside them.
+/// One debugged process: start-up, run control, events to the IDE's listener.
+/// Its state lives in components of one concern and one lock each: request
+/// engine, pending events, module table, language query, and the inspection
+/// components (inspectcomponents.h), whose operations live in src/inspect.
 ///
 /// Lock order, outer to inner: the live-process lock (liveprocesses.h, held
 /// for a whole delivery on the main thread); the language query's lock (the
@@ -139,6 +138,7 @@ public:
   bool CanSetRunToMainBreakpoint() const { return FBreakOnMain != nullptr; } ///< run-to-main breakpoint placed
   TGDBThreadTable& Threads() { return *FThreads; }
   TGDBRegisterIds& Registers() { return *FRegisters; }
+  TGDBEvaluator& Evaluator() { return *FEvaluator; }
   TGDBKernel& Kernel() { return *FKernel; }
   TGDBCPU CPU() const { return FRequests.CPU(); }
   const TWaitPolicy& WaitPolicy() const { return FRequests.Policy(); }
@@ -202,10 +202,10 @@ private:
   TInspectPtr<TGDBLineCache> FLines;
   TInspectPtr<TGDBMemoryCache> FMemory;
   TInspectPtr<TGDBRegisterIds> FRegisters;
+  TInspectPtr<TGDBEvaluator> FEvaluator;
   TIntfPtr<IGDBBreakpointListener> FBreakOnMain;
   TGDBConsoleQuery FLanguageQuery{"show language", "The current source language is \"", '"'}; ///< GDB 13's words
   TProgramTerminal FTerminal;
-
   TLiveProcessKey FLiveKey;
   std::thread FOutputThread; ///< the only reader of the debugger
   std::string FLaunchErrorMessage;

@@ -108,6 +108,10 @@ void TGDBProcess::NotifySignalReceived(const TGDBException& SignalException, Int
   // arrives; a program that raises them itself gets them reported as
   // signals. Before the program's first stop only the debugger's own SIGSTOP
   // (attaching) is expected.
+  // A function called by an expression faulted: GDB has put the program
+  // back where it stopped and fails the evaluation, which says why.
+  if (FEvaluating && !FKernel->IsLLDB())
+    return;
   const std::string& Name = SignalException.Name;
   const bool Expected =
       (FSuspending && (Name == "SIGINT" || Name == "SIGSTOP" || Name == "SIGTRAP")) ||

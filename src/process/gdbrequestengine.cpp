@@ -42,7 +42,7 @@ bool TGDBRequestEngine::SendAndWait(const std::string& Key, const std::string& L
   assert(std::this_thread::get_id() != FReader.load());
   if (FResuming) {
     Result.FError = true;
-    Result.SetErrorMessage("process not suspended");
+    Result.SetErrorMessage(NotSuspendedMessage);
     return false;
   }
   AddWaitObject(Key, Result);

@@ -25,6 +25,9 @@
 
 namespace midebug {
 
+/// The answer to a request made while the program runs.
+inline constexpr const char* NotSuspendedMessage = "process not suspended";
+
 /// How long synchronous requests wait. Production uses the defaults; tests
 /// shorten them so that time-out behaviour takes milliseconds.
 struct TWaitPolicy {

@@ -14,6 +14,7 @@ class TGDBFileTable;
 class TGDBLineCache;
 class TGDBMemoryCache;
 class TGDBRegisterIds;
+class TGDBEvaluator;
 
 /// Frees an inspection component where its type is complete.
 struct TInspectDeleter {
@@ -23,6 +24,7 @@ struct TInspectDeleter {
   void operator()(TGDBLineCache* Component) const;
   void operator()(TGDBMemoryCache* Component) const;
   void operator()(TGDBRegisterIds* Component) const;
+  void operator()(TGDBEvaluator* Component) const;
 };
 template <class T>
 using TInspectPtr = std::unique_ptr<T, TInspectDeleter>;

@@ -197,6 +197,7 @@ void TCliSession::OnSuspended(Integer ThreadId) {
     Text += "\n" + Source;
   }
   FOutput.Emit(Event, Text);
+  ShowDisplays();
 }
 
 void TCliSession::OnResumed(Integer ThreadId) {

@@ -117,6 +117,16 @@ const std::vector<TCliSession::TCommandEntry>& TCliSession::Commands() {
       {"info line", &TCliSession::CmdInfoLine, 1, "info line FILE:LINE | *ADDRESS", "the code addresses of a source line"},
       {"jump", &TCliSession::CmdJump, 1, "jump LINE",
        "make LINE of the current function the next statement ('continue' runs on from there)"},
+      {"print", &TCliSession::CmdPrint, AnyArguments, "print[/x|/d|/c] EXPRESSION", "the value of an expression"},
+      {"print/x", &TCliSession::CmdPrint, AnyArguments, "print/x EXPRESSION", "the value in hexadecimal"},
+      {"print/d", &TCliSession::CmdPrint, AnyArguments, "print/d EXPRESSION", "the value in decimal"},
+      {"print/c", &TCliSession::CmdPrint, AnyArguments, "print/c EXPRESSION", "the value as a character"},
+      {"set var", &TCliSession::CmdSetVar, AnyArguments, "set var EXPRESSION = VALUE", "assign a value to a variable"},
+      {"info locals", &TCliSession::CmdInfoValues, 0, "info locals", "the current frame's local variables"},
+      {"info args", &TCliSession::CmdInfoValues, 0, "info args", "the current frame's arguments"},
+      {"inspect", &TCliSession::CmdInspect, AnyArguments, "inspect EXPRESSION [FROM COUNT]",
+       "a value's children, one level"},
+      {"display", &TCliSession::CmdDisplay, AnyArguments, "display EXPRESSION", "print an expression at every stop"},
       {"help", &TCliSession::CmdHelp, 0, "help", "this list"},
   };
   return Table;

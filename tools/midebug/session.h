@@ -133,6 +133,22 @@ private:
   /// Line; empty when none is found.
   std::string SourcePath(const std::string& Name, Integer Line);
   // -------------------------------------------------------------------------
+  // --- Values (evaluatecommands.cpp) -------------------------------------
+  /// An expression takes any number of words.
+  static constexpr size_t AnyArguments = SIZE_MAX;
+  void CmdPrint(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdSetVar(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdInfoValues(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdInspect(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdDisplay(const std::string& Name, const std::vector<std::string>& Arguments);
+  /// Prints the displayed expressions at a stop, marking those that changed.
+  void ShowDisplays();
+  struct TDisplay {
+    std::string Expr;
+    std::string Value;
+  };
+  std::vector<TDisplay> FDisplays;
+  // --- end of values ------------------------------------------------------
 
   /// Has the debugger load the program (again); raises when it cannot.
   void Load(TGDBLanguage Language, TGDBCPU CPU);
