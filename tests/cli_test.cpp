@@ -196,6 +196,8 @@ TEST_F(CliTest, CliSteppingNextStepAndFinishFollowTheSource) {
   // Out of square, back in main's loop line.
   EXPECT_EQ(FileName(*Stops[4]), "loop.c");
   EXPECT_EQ((*Stops[4])["line"], LineOf("main-call"));
+  EXPECT_EQ((*Stops[4])["returned"], "1") << "square(1)";
+  EXPECT_FALSE(Stops[3]->contains("returned"));
 
   const json* Backtrace = Run.Answer("bt");
   ASSERT_NE(Backtrace, nullptr);

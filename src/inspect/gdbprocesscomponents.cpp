@@ -42,4 +42,8 @@ Integer TGDBProcess::ForgetStop() {
 
 void TGDBProcess::ForgetLineAddresses() { FLines->ForgetLineAddresses(); }
 
+void TGDBProcess::NotifyReturnValue(const std::string& Value) { FThreads->SetReturnValue(Value); }
+
+std::string TGDBProcess::GetReturnValue() { return FThreads->ReturnValue(); }
+
 } // namespace midebug

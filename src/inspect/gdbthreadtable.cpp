@@ -136,7 +136,18 @@ Integer TGDBThreadTable::Resume() {
   const Integer Id = FStopped ? FStopped->FId : -1;
   FStopped = nullptr;
   FInlineLocation = DummyLocation;
+  FReturnValue.clear();
   return Id;
+}
+
+void TGDBThreadTable::SetReturnValue(const std::string& Value) {
+  std::lock_guard Guard(FLock);
+  FReturnValue = Value;
+}
+
+std::string TGDBThreadTable::ReturnValue() {
+  std::lock_guard Guard(FLock);
+  return FReturnValue;
 }
 
 void TGDBThreadTable::SetInlineLocation(const TGDBLocation& Location) {

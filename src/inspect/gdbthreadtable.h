@@ -54,8 +54,11 @@ public:
   /// Records Frame (0-based) and its location on the stopped thread.
   void SetStoppedFrame(Integer Frame, const TGDBLocation& Location);
   /// The program runs on: the stopped thread's number (-1 without one); no
-  /// thread is stopped and the inline location is forgotten.
+  /// thread is stopped, the inline location and return value are forgotten.
   Integer Resume();
+  /// What the last finished function returned; empty after a resume.
+  void SetReturnValue(const std::string& Value);
+  std::string ReturnValue();
 
   // --- Requests (src/inspect/gdbprocessthreads.cpp) ----------------------
   /// The location of the debugger's current frame, or the empty location.
@@ -102,6 +105,7 @@ private:
   /// Points into FThreads; the table holds the reference.
   TGDBThread* FStopped = nullptr;
   TGDBLocation FInlineLocation;
+  std::string FReturnValue;
 };
 
 } // namespace midebug

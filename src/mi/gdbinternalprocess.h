@@ -69,6 +69,9 @@ public:
   /// GDB changed a breakpoint: where it now stands, one location per place,
   /// none while it is pending. GDB also says so at every hit.
   virtual void NotifyBreakpointLocations(Integer /*Breakpoint*/, const TGDBLocationArray& /*Locations*/) {}
+  /// A finished function returned Value (as the debugger prints it), told
+  /// just before the stop it ends with.
+  virtual void NotifyReturnValue(const std::string& /*Value*/) {}
 };
 
 } // namespace midebug

@@ -341,6 +341,8 @@ void TGDBOutputParser::ProcessStopRecord() {
       FProcess.NotifyProcessSuspended(FLocation, ThreadId, tsrAtBreakpoint);
   } else if (Reason == "function-finished" || Reason == "location-reached" || Reason == "end-stepping-range") {
     ParseStopFrame(FScanner, FLocation, ThreadId);
+    if (Reason == "function-finished")
+      FProcess.NotifyReturnValue(std::string(FScanner.FindValue("return-value")));
     FProcess.NotifyProcessSuspended(FLocation, ThreadId, tsrStepDone);
   } else if (Reason == "watchpoint-scope") {
     FProcess.NotifyWatchpointOutOfScope();

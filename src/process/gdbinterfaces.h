@@ -238,6 +238,9 @@ public:
   /// The start of the function that holds Address, as its disassembly
   /// tells; 0 when unknown.
   virtual UInt64 GetFunctionStart(UInt64 Address) = 0;
+  /// What the function that the last finish left returned, as the debugger
+  /// prints it; empty when the program stopped otherwise or none was told.
+  virtual std::string GetReturnValue() = 0;
   /// A breakpoint on every function of that name, in the program and in the
   /// libraries it loads (later ones included); reported as a source one.
   virtual void CreateFunctionBreakpoint(const std::string& FunctionName,

@@ -90,6 +90,7 @@ public:
   bool IsDying() override { return FDying; }
   Integer GetModuleId(const std::string& Name) override { return FModules.GetModuleId(Name); }
   void NotifyCommandRefused(const std::string& Message) override;
+  void NotifyReturnValue(const std::string& Value) override;
   void NotifyBreakpointLocations(Integer Breakpoint, const TGDBLocationArray& Locations) override;
 
   // --- IGDBProcess ---------------------------------------------------------
@@ -132,6 +133,7 @@ public:
   UInt64 GetBaseAddress() override { return FBaseAddress; }
   TGDBModule GetModule(Integer Id) override { return FModules.Current(Id); }
   UInt64 GetFunctionStart(UInt64 Address) override;
+  std::string GetReturnValue() override;
   void CreateFunctionBreakpoint(const std::string& Name, const TIntfPtr<IGDBBreakpointListener>& Listener) override;
   void CreateSizedWatchBreakpoint(UInt64 Address, Integer Size, bool ReadFlag, bool AccessFlag,
                                   const TIntfPtr<IGDBBreakpointListener>& Listener) override;
@@ -155,9 +157,7 @@ protected:
   std::unique_ptr<TGDBKernel> FKernel;
 
 private:
-  /// Refreshes the threads through the requests and tells the IDE of them.
-  friend class TGDBThreadTable;
-
+  friend class TGDBThreadTable; ///< refreshes the threads through the requests and tells the IDE
   void OutputThreadExecute();
   void SendStartupSettings();
   void SetProgramEnvironment();

@@ -191,6 +191,12 @@ void TCliSession::OnSuspended(Integer ThreadId) {
   std::string Text = Why + " in thread " + std::to_string(ThreadId) + ": " +
                      (Header.empty() ? LocationText(Location) : FrameText(-1, Header, Location));
   DescribeHit(Event, Text);
+  if (FProcess) {
+    if (const std::string Returned = FProcess->GetReturnValue(); !Returned.empty()) {
+      Event["returned"] = Returned;
+      Text += "\nValue returned: " + Returned;
+    }
+  }
   const std::string Source = SourceText(Location);
   if (!Source.empty()) {
     Event["text"] = FSources.Line(Location.Source, Location.Line);
