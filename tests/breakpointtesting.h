@@ -54,12 +54,7 @@ private:
 
 /// The line of a debuggee's source marked "// line:Marker"; 0 without one.
 inline Integer MarkedLine(const std::string& FileName, const std::string& Marker) {
-  std::ifstream Source(DebuggeeSource(FileName));
-  std::string Text;
-  for (Integer Line = 1; std::getline(Source, Text); ++Line)
-    if (Text.find("line:" + Marker) != std::string::npos)
-      return Line;
-  return 0;
+  return LineOf(FileName, "line:" + Marker);
 }
 
 class TDebugFixture : public ::testing::Test {

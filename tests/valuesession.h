@@ -19,17 +19,6 @@
 
 namespace midebug::test {
 
-/// The 1-based line of the debuggee source FileName that contains Marker; 0
-/// when none does.
-inline Integer LineOf(const std::string& FileName, const std::string& Marker) {
-  std::ifstream Source(DebuggeeSource(FileName));
-  std::string Line;
-  for (Integer Number = 1; std::getline(Source, Line); ++Number)
-    if (Line.find(Marker) != std::string::npos)
-      return Number;
-  return 0;
-}
-
 class ValueSession : public ::testing::Test {
 protected:
   void SetUp() override { SetMainThread(); }
