@@ -146,14 +146,6 @@ TEST_F(InspectInC, TheLocalsViewOfTwoHundredLocalsIsRebuiltWhenTheFrameChanges) 
   EXPECT_EQ(Members(Locals), (Strings{"origin={...}"})) << "the innermost frame is main's now";
 }
 
-} // namespace
-} // namespace midebug
-
-namespace midebug {
-namespace {
-
-using Strings = std::vector<std::string>;
-
 /// tests/debuggees/cppvalues.cpp, first before its containers are built,
 /// then once they hold their values.
 class InspectInCpp : public test::ValueSession {
@@ -198,14 +190,6 @@ TEST_F(InspectInCpp, AClassShowsItsBasesAndItsMembersUnderTheirAccessGroups) {
   const TIntfPtr<IGDBInspect> Named = Square->CreateSubInspector(iiVariable, 0);
   EXPECT_EQ(Members(Named->CreateSubInspector(iiVariable, 0)), (Strings{"label=\"shape\""}));
 }
-
-} // namespace
-} // namespace midebug
-
-namespace midebug {
-namespace {
-
-using Strings = std::vector<std::string>;
 
 /// tests/debuggees/pasvalues.pas stopped in Total, whose parameter is an
 /// open array, built with the default debug format and with DWARF 3.
@@ -253,14 +237,6 @@ TEST_P(InspectInPascal, EveryKindOfValueShowsWithoutKillingGdb) {
 }
 
 INSTANTIATE_TEST_SUITE_P(DebugFormats, InspectInPascal, ::testing::Values("pasvalues", "pasvalues-gw3"));
-
-} // namespace
-} // namespace midebug
-
-namespace midebug {
-namespace {
-
-using Strings = std::vector<std::string>;
 
 /// tests/debuggees/values.c under LLDB's real MI front end, where it runs.
 class InspectOnLLDB : public test::ValueSession {
