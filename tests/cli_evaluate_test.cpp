@@ -21,10 +21,10 @@ test::TCliRun RunValues(const std::string& Commands) {
   return test::RunCli(Scratch, test::Quote(test::Debuggee("clivalues")), "start\nnext\nnext\nnext\n" + Commands);
 }
 
-TEST(CliValues, PrintInEveryFormatAndSetVarReachTheProgram) {
-  const test::TCliRun Run = RunValues("print count\nprint/x count + 10\nprint/d pt.left\nprint/c 65\n"
-                                            "print $_streq(\"a b\", \"a b\")\nprint nosuch\n"
-                                            "set var count = count * 7\nset var count\nprint count\n");
+TEST(CliValues, InfoListsTheFrameAndPrintInEveryFormatAndSetVarReachTheProgram) {
+  const test::TCliRun Run = RunValues("info args\ninfo locals\nprint count\nprint/x count + 10\nprint/d pt.left\n"
+                                      "print/c 65\nprint $_streq(\"a b\", \"a b\")\nprint nosuch\n"
+                                      "set var count = count * 7\nset var count\nprint count\n");
   const std::vector<json> Prints = Run.All("answer", "print");
   ASSERT_EQ(Prints.size(), 7u);
   const char* Values[] = {"5", "0xf", "1", "65 'A'", "1", nullptr, "35"};
@@ -40,10 +40,6 @@ TEST(CliValues, PrintInEveryFormatAndSetVarReachTheProgram) {
   ASSERT_EQ(Sets.size(), 2u);
   EXPECT_EQ(Sets[0].value("value", ""), "35");
   EXPECT_EQ(Sets[1].value("error", ""), "usage: set var EXPRESSION = VALUE");
-}
-
-TEST(CliValues, InfoArgsAndLocalsListTheFrame) {
-  const test::TCliRun Run = RunValues("info args\ninfo locals\n");
   const std::vector<json> Arguments = Run.All("answer", "info args");
   ASSERT_EQ(Arguments.size(), 1u);
   ASSERT_EQ(Arguments[0]["variables"].size(), 2u);

@@ -7,7 +7,6 @@
 #include <gtest/gtest.h>
 #include <nlohmann/json.hpp>
 
-#include <cstdio>
 #include <filesystem>
 #include <regex>
 #include <string>
@@ -63,13 +62,8 @@ TEST_F(CliTest, CliCommandsThatCannotRunSayWhyAndTheSessionGoesOn) {
 // --- Attaching -----------------------------------------------------------------
 
 TEST_F(CliTest, CliAttachShowsTheStackAndDetachLeavesTheProgramRunning) {
-  const std::string Program = Debuggee("sleeper");
-  const std::string Start = "exec " + Quote(Program) + " >/dev/null 2>&1 & echo $!";
-  FILE* Shell = popen(Start.c_str(), "r");
-  ASSERT_NE(Shell, nullptr);
-  int Pid = 0;
-  ASSERT_EQ(std::fscanf(Shell, "%d", &Pid), 1);
-  pclose(Shell);
+  const int Pid = test::StartDebuggee("sleeper");
+  ASSERT_NE(Pid, 0);
   const TCliRun Run = RunCli("--attach " + std::to_string(Pid), "bt\ndetach\n");
   const bool StillRunning = kill(Pid, 0) == 0;
   kill(Pid, SIGKILL);

@@ -41,6 +41,16 @@ Integer LineOf(const std::string& FileName, const std::string& Marker) {
   return 0;
 }
 
+int StartDebuggee(const std::string& Name) {
+  FILE* Shell = popen(("exec " + Quote(Debuggee(Name)) + " >/dev/null 2>&1 & echo $!").c_str(), "r");
+  int Pid = 0;
+  if (Shell && std::fscanf(Shell, "%d", &Pid) != 1)
+    Pid = 0;
+  if (Shell)
+    pclose(Shell);
+  return Pid;
+}
+
 std::string FakeScript(const std::string& Name) { return TestDataDir() + "/fakemi/" + Name; }
 
 namespace {

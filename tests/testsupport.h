@@ -49,6 +49,10 @@ std::string LLDBMIPath(std::string& WhyNot);
 /// program).
 std::vector<int> ChildrenNamed(const std::string& Name, int Parent = 0);
 
+/// Starts a debuggee in the background, its output dropped; its process id,
+/// 0 when it did not start.
+int StartDebuggee(const std::string& Name);
+
 /// Whether Pid names a process that has not ended (a zombie has ended).
 bool ProcessRuns(int Pid);
 
