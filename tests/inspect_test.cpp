@@ -210,15 +210,15 @@ TEST_P(InspectInPascal, EveryKindOfValueShowsWithoutKillingGdb) {
       {"Ansi", "'ansi text'"}, {"Wide", "'wide text'"}, {"Pair", "{Left = 1, Right = 2}"}, {"Shape", "0x"},
       {"Colours", "[Red, Blue]"}, {"Colour", "Green"}, {"Index", ""}, {"Fixed[2]", "22"},
   };
+  const auto Upper = [](std::string Text) {
+    for (char& Letter : Text)
+      Letter = static_cast<char>(std::toupper(static_cast<unsigned char>(Letter)));
+    return Text;
+  };
   for (const auto& Case : Cases) {
-    std::string Value = Eval(Case.Expr);
+    const std::string Value = Eval(Case.Expr);
     EXPECT_FALSE(Value.starts_with("error:")) << Case.Expr << ": " << Value;
-    for (char& Letter : Value)
-      Letter = static_cast<char>(std::toupper(static_cast<unsigned char>(Letter)));
-    std::string Expected = Case.Value;
-    for (char& Letter : Expected)
-      Letter = static_cast<char>(std::toupper(static_cast<unsigned char>(Letter)));
-    EXPECT_NE(Value.find(Expected), std::string::npos) << Case.Expr << ": " << Value;
+    EXPECT_NE(Upper(Value).find(Upper(Case.Value)), std::string::npos) << Case.Expr << ": " << Value;
 
     const TIntfPtr<IGDBInspect> Inspector = Thread()->CreateInspector(Case.Expr, 1);
     for (Integer Index = 0; Index < std::min(Inspector->GetMemberCount(), 3); ++Index) {
@@ -243,9 +243,7 @@ class InspectOnLLDB : public test::ValueSession {
 protected:
   void SetUp() override {
     ValueSession::SetUp();
-    std::string WhyNot;
-    const std::string LLDB = test::LLDBMIPath(WhyNot);
-    if (LLDB.empty())
+    if (!FindLLDB())
       GTEST_SKIP() << WhyNot;
     Process = TGDBProcessManager::CreateProcess(Listener, test::Debuggee("values"), "", "", "local", "Linux64", glC,
                                                 gcAMD64, LLDB);

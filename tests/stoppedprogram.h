@@ -77,6 +77,11 @@ public:
 
   TGDBProcess& Core() { return *static_cast<TGDBProcess*>(Process.get()); }
 
+  /// Finds LLDB's MI front end; false, with the reason to skip in WhyNot,
+  /// where it does not run here.
+  bool FindLLDB() { return !(LLDB = LLDBMIPath(WhyNot)).empty(); }
+  std::string LLDB, WhyNot;
+
   TIntfPtr<TTestListener> Listener{new TTestListener};
   TIntfPtr<IGDBProcess> Process;
 
