@@ -205,9 +205,7 @@ TEST_F(BreakpointsOnLLDB, MatchedAddressesAreEachTheirOwnBreakpointAndTheAllOnes
 }
 
 TEST_F(BreakpointsOnLLDB, TheRealFrontEndVerifiesAndHitsASourceBreakpointAndNotAMissingFile) {
-  std::string WhyNot;
-  const std::string LLDB = test::LLDBMIPath(WhyNot);
-  if (LLDB.empty())
+  if (!FindLLDB())
     GTEST_SKIP() << WhyNot;
   Process = TGDBProcessManager::CreateProcess(Listener, Debuggee("breakpoints"), "", Scratch.Path(), "local",
                                               "Linux64", glC, gcAMD64, LLDB);

@@ -4,14 +4,8 @@
 /// records what it hears, and a fixture that debugs a program through the
 /// "local" profile.
 
-#include "midebug.h"
-#include "process/gdbprocess.h"
-#include "testlistener.h"
-#include "testsupport.h"
+#include "stoppedprogram.h"
 
-#include <gtest/gtest.h>
-
-#include <fstream>
 #include <mutex>
 #include <string>
 #include <vector>
@@ -54,17 +48,13 @@ private:
 
 /// The line of a debuggee's source marked "// line:Marker"; 0 without one.
 inline Integer MarkedLine(const std::string& FileName, const std::string& Marker) {
-  std::ifstream Source(DebuggeeSource(FileName));
-  std::string Text;
-  for (Integer Line = 1; std::getline(Source, Text); ++Line)
-    if (Text.find("line:" + Marker) != std::string::npos)
-      return Line;
-  return 0;
+  return LineOf(FileName, "line:" + Marker);
 }
 
-class TDebugFixture : public ::testing::Test {
+/// A program debugged in a scratch working directory, started as the IDE
+/// starts it.
+class TDebugFixture : public StoppedProgram {
 protected:
-  void SetUp() override { SetMainThread(); }
   void TearDown() override {
     Process = nullptr;
     ProcessPending();
@@ -92,19 +82,9 @@ protected:
   TIntfPtr<IGDBThread> Stopped() { return Process->GetThread(Process->GetSuspendedThreadId()); }
   TGDBLocation StopLocation() { return Stopped()->GetCurrentLocation(); }
   TThreadStopReason StopReason() { return Stopped()->GetStopReason(); }
-  /// The value of a C expression in the stopped program, as a number.
-  UInt64 AddressOf(const std::string& Expression) {
-    TDataEvaluateExpressionResult Value;
-    auto& Requests = static_cast<TGDBProcess*>(Process.get())->Requests();
-    if (!Requests.Ask(Value, &TGDBCommand::CreateDataEvaluateExpressionCommand, Expression))
-      return 0;
-    return std::stoull(Value.FValue.substr(Value.FValue.find("0x")), nullptr, 16);
-  }
   static TIntfPtr<TBreakpointRecorder> Recorder() { return TIntfPtr<TBreakpointRecorder>(new TBreakpointRecorder); }
 
   TScratchDir Scratch;
-  TIntfPtr<TTestListener> Listener{new TTestListener};
-  TIntfPtr<IGDBProcess> Process;
   size_t StopsSeen = 0;
 };
 

@@ -5,8 +5,6 @@
 
 #include <nlohmann/json.hpp>
 
-#include <cstdio>
-#include <sstream>
 
 namespace midebug {
 namespace {
@@ -14,39 +12,9 @@ namespace {
 using nlohmann::json;
 using test::Debuggee;
 
-std::string Quote(const std::string& Text) { return "'" + Text + "'"; }
-
-/// The JSON objects one batch run printed.
-class TBatch {
-public:
-  TBatch(const test::TScratchDir& Scratch, const std::string& Arguments, const std::string& Commands) {
-    const std::string Input = Scratch.WriteFile("commands.txt", Commands);
-    const std::string Output = Scratch.Path() + "/stdout.txt";
-    const std::string Command = "cd " + Quote(Scratch.Path()) + " && " + Quote(MIDEBUG_CLI) +
-                                " --batch --json --wait 20 " + Arguments + " < " + Quote(Input) + " > " +
-                                Quote(Output) + " 2>/dev/null";
-    Status = std::system(Command.c_str());
-    std::ifstream Lines(Output);
-    for (std::string Line; std::getline(Lines, Line);) {
-      Text += Line + "\n";
-      json Object = json::parse(Line, nullptr, false);
-      if (!Object.is_discarded())
-        Objects.push_back(std::move(Object));
-    }
-  }
-  /// Every object whose Key is Value, in order.
-  std::vector<json> All(const std::string& Key, const std::string& Value) const {
-    std::vector<json> Found;
-    for (const json& Object : Objects)
-      if (Object.value(Key, "") == Value)
-        Found.push_back(Object);
-    return Found;
-  }
-  std::vector<json> Objects;
-  std::string Text;
-  /// A batch with a failed command ends with a failure.
-  int Status = -1;
-};
+using test::Quote;
+using test::RunCli;
+using test::TCliRun;
 
 Integer Line(const std::string& File, const std::string& Marker) { return test::MarkedLine(File, Marker); }
 
@@ -57,11 +25,11 @@ protected:
 
 TEST_F(CliBreakpoints, BreakpointsStopSayWhichCountHitsAndFollowIgnoreEnableDisableAndDelete) {
   const std::string Bump = "breakpoints.c:" + std::to_string(Line("breakpoints.c", "bump-add"));
-  const TBatch Run(Scratch, Quote(Debuggee("breakpoints")) + " 3",
+  const TCliRun Run = RunCli(Scratch, Quote(Debuggee("breakpoints")) + " 3",
                    "break " + Bump + "\ntbreak main\nbreak nosuch.c:3\nrun\ninfo breakpoints\nignore 1 1\ncontinue\n"
                    "disable 1\nenable 1\ncontinue\ninfo breakpoints\ndelete 1\ncontinue\n");
   const auto Stops = Run.All("event", "stopped");
-  ASSERT_EQ(Stops.size(), 3u) << Run.Text;
+  ASSERT_EQ(Stops.size(), 3u) << Run.Stdout;
   EXPECT_EQ(Stops[0]["breakpoint"], 2);
   EXPECT_EQ(Stops[1]["breakpoint"], 1);
   EXPECT_EQ(Stops[1]["line"], Line("breakpoints.c", "bump-add"));
@@ -76,20 +44,12 @@ TEST_F(CliBreakpoints, BreakpointsStopSayWhichCountHitsAndFollowIgnoreEnableDisa
 }
 
 TEST_F(CliBreakpoints, WatchStopsWhereTheWatchedBytesAreWrittenAndSaysWhichWatchpoint) {
-  // GDB runs programs at the same place every time: the global's address is
-  // its offset in the file plus that base.
-  FILE* Symbols = popen(("nm " + Quote(Debuggee("breakpoints")) + " | grep ' counter$'").c_str(), "r");
-  ASSERT_NE(Symbols, nullptr);
-  unsigned long long Offset = 0;
-  ASSERT_EQ(std::fscanf(Symbols, "%llx", &Offset), 1);
-  pclose(Symbols);
-  std::ostringstream Address;
-  Address << "0x" << std::hex << (0x555555554000ull + Offset);
-  const TBatch Run(Scratch, Quote(Debuggee("breakpoints")) + " 1",
-                   "start\nwatch " + Address.str() + " 8\nwatch -r " + Address.str() + " 8\ndelete 2\ncontinue\n" +
+  const std::string Address = test::Hex(test::SymbolAddress(Debuggee("breakpoints"), "counter"));
+  const TCliRun Run = RunCli(Scratch, Quote(Debuggee("breakpoints")) + " 1",
+                   "start\nwatch " + Address + " 8\nwatch -r " + Address + " 8\ndelete 2\ncontinue\n" +
                        "continue\nwatch\nwatch -a 0x10 zero\n");
   const auto Stops = Run.All("event", "stopped");
-  ASSERT_EQ(Stops.size(), 3u) << Run.Text;
+  ASSERT_EQ(Stops.size(), 3u) << Run.Stdout;
   EXPECT_TRUE(Stops[1]["breakpoint"] == 1 && Stops[2]["breakpoint"] == 1);
   EXPECT_EQ(Stops[2]["line"], Line("breakpoints.c", "upper-read"));
   const auto Watches = Run.All("answer", "watch");
@@ -100,23 +60,23 @@ TEST_F(CliBreakpoints, WatchStopsWhereTheWatchedBytesAreWrittenAndSaysWhichWatch
 }
 
 TEST_F(CliBreakpoints, CatchStopsAtExceptionsNamedByTheirTypeAndMessageAndUncatchLetsThemGo) {
-  const TBatch Cpp(Scratch, Quote(Debuggee("throws")) + " 1", "catch throw\nrun\nuncatch\ncontinue\n");
+  const TCliRun Cpp = RunCli(Scratch, Quote(Debuggee("throws")) + " 1", "catch throw\nrun\nuncatch\ncontinue\n");
   const auto Thrown = Cpp.All("event", "exception");
-  ASSERT_EQ(Thrown.size(), 1u) << Cpp.Text;
+  ASSERT_EQ(Thrown.size(), 1u) << Cpp.Stdout;
   EXPECT_TRUE(Thrown[0]["name"] == "std::runtime_error" && Thrown[0]["kind"] == "throw");
   EXPECT_EQ(Thrown[0]["line"], Line("throws.cpp", "throw"));
   EXPECT_EQ(Cpp.All("event", "stopped")[0]["reason"], "exception");
   EXPECT_EQ(Cpp.All("event", "exited")[0]["code"], 0);
 
-  const TBatch Pascal(Scratch, Quote(Debuggee("raises")), "catch raise\nrun\ncontinue\ncontinue\n");
+  const TCliRun Pascal = RunCli(Scratch, Quote(Debuggee("raises")), "catch raise\nrun\ncontinue\ncontinue\n");
   const auto Raised = Pascal.All("event", "exception");
-  ASSERT_EQ(Raised.size(), 2u) << Pascal.Text;
+  ASSERT_EQ(Raised.size(), 2u) << Pascal.Stdout;
   EXPECT_TRUE(Raised[0]["name"] == "ETooDeep" && Raised[0]["description"] == "depth 12 is too deep");
   EXPECT_EQ(Raised[1]["name"], "TPlain");
 }
 
 TEST_F(CliBreakpoints, WrongArgumentsGetAClearErrorAndTheSessionGoesOn) {
-  const TBatch Run(Scratch, Quote(Debuggee("breakpoints")),
+  const TCliRun Run = RunCli(Scratch, Quote(Debuggee("breakpoints")),
                    "break *0xZZ\nbreak a.c:x\ndelete 7\nignore 9 1\ninfo frobs\ncatch bogus\n"
                    "break main\ninfo breakpoints\n");
   const std::pair<const char*, const char*> Expected[] = {
@@ -128,16 +88,16 @@ TEST_F(CliBreakpoints, WrongArgumentsGetAClearErrorAndTheSessionGoesOn) {
       {"catch", "usage: catch throw|catch|raise"},
   };
   std::vector<json> Errors;
-  for (const json& Object : Run.Objects)
+  for (const json& Object : Run.Lines)
     if (Object.contains("error"))
       Errors.push_back(Object);
-  ASSERT_EQ(Errors.size(), std::size(Expected)) << Run.Text;
+  ASSERT_EQ(Errors.size(), std::size(Expected)) << Run.Stdout;
   for (size_t Index = 0; Index < Errors.size(); ++Index) {
     EXPECT_EQ(Errors[Index]["answer"], Expected[Index].first);
     EXPECT_EQ(Errors[Index]["error"], Expected[Index].second);
   }
   EXPECT_EQ(Run.All("answer", "info breakpoints").back()["breakpoints"][0]["verified"], true);
-  EXPECT_NE(Run.Status, 0);
+  EXPECT_NE(Run.ExitCode, 0);
 }
 
 } // namespace

@@ -6,9 +6,6 @@
 #include <gtest/gtest.h>
 #include <nlohmann/json.hpp>
 
-#include <cstdlib>
-#include <fstream>
-#include <sstream>
 #include <string>
 #include <vector>
 
@@ -17,37 +14,18 @@ namespace {
 
 using nlohmann::json;
 
-/// The JSON lines `midebug --batch --json` printed for Commands, run after
-/// "start" and three steps (count, pt and many set).
-std::vector<json> RunValues(const std::string& Commands) {
+/// What `midebug --batch --json` printed for Commands, run after "start" and
+/// three steps (count, pt and many set).
+test::TCliRun RunValues(const std::string& Commands) {
   test::TScratchDir Scratch;
-  const std::string Input = Scratch.WriteFile("commands.txt", "start\nnext\nnext\nnext\n" + Commands);
-  const std::string Output = Scratch.Path() + "/stdout.txt";
-  const std::string Command = std::string("'") + MIDEBUG_CLI + "' --batch --json --wait 20 '" +
-                              test::Debuggee("clivalues") + "' < '" + Input + "' > '" + Output + "' 2>/dev/null";
-  // A batch with a failed command ends with a failure code: the answers tell.
-  (void)std::system(Command.c_str());
-  std::vector<json> Lines;
-  std::ifstream Stream(Output);
-  for (std::string Line; std::getline(Stream, Line);)
-    Lines.push_back(json::parse(Line, nullptr, false));
-  return Lines;
+  return test::RunCli(Scratch, test::Quote(test::Debuggee("clivalues")), "start\nnext\nnext\nnext\n" + Commands);
 }
 
-/// The objects whose Key is Value, in order.
-std::vector<json> All(const std::vector<json>& Lines, const std::string& Key, const std::string& Value) {
-  std::vector<json> Found;
-  for (const json& Line : Lines)
-    if (Line.is_object() && Line.value(Key, "") == Value)
-      Found.push_back(Line);
-  return Found;
-}
-
-TEST(CliValues, PrintInEveryFormatAndSetVarReachTheProgram) {
-  const std::vector<json> Lines = RunValues("print count\nprint/x count + 10\nprint/d pt.left\nprint/c 65\n"
-                                            "print $_streq(\"a b\", \"a b\")\nprint nosuch\n"
-                                            "set var count = count * 7\nset var count\nprint count\n");
-  const std::vector<json> Prints = All(Lines, "answer", "print");
+TEST(CliValues, InfoListsTheFrameAndPrintInEveryFormatAndSetVarReachTheProgram) {
+  const test::TCliRun Run = RunValues("info args\ninfo locals\nprint count\nprint/x count + 10\nprint/d pt.left\n"
+                                      "print/c 65\nprint $_streq(\"a b\", \"a b\")\nprint nosuch\n"
+                                      "set var count = count * 7\nset var count\nprint count\n");
+  const std::vector<json> Prints = Run.All("answer", "print");
   ASSERT_EQ(Prints.size(), 7u);
   const char* Values[] = {"5", "0xf", "1", "65 'A'", "1", nullptr, "35"};
   for (size_t Index = 0; Index < Prints.size(); ++Index) {
@@ -58,20 +36,16 @@ TEST(CliValues, PrintInEveryFormatAndSetVarReachTheProgram) {
     EXPECT_EQ(Prints[Index].value("value", ""), Values[Index]) << Prints[Index].dump();
   }
   EXPECT_EQ(Prints[0].value("type", ""), "int");
-  const std::vector<json> Sets = All(Lines, "answer", "set var");
+  const std::vector<json> Sets = Run.All("answer", "set var");
   ASSERT_EQ(Sets.size(), 2u);
   EXPECT_EQ(Sets[0].value("value", ""), "35");
   EXPECT_EQ(Sets[1].value("error", ""), "usage: set var EXPRESSION = VALUE");
-}
-
-TEST(CliValues, InfoArgsAndLocalsListTheFrame) {
-  const std::vector<json> Lines = RunValues("info args\ninfo locals\n");
-  const std::vector<json> Arguments = All(Lines, "answer", "info args");
+  const std::vector<json> Arguments = Run.All("answer", "info args");
   ASSERT_EQ(Arguments.size(), 1u);
   ASSERT_EQ(Arguments[0]["variables"].size(), 2u);
   EXPECT_EQ(Arguments[0]["variables"][0].value("name", ""), "argc");
   EXPECT_EQ(Arguments[0]["variables"][0].value("value", ""), "1");
-  const std::vector<json> Locals = All(Lines, "answer", "info locals");
+  const std::vector<json> Locals = Run.All("answer", "info locals");
   ASSERT_EQ(Locals.size(), 1u);
   ASSERT_EQ(Locals[0]["variables"].size(), 3u);
   EXPECT_EQ(Locals[0]["variables"][0].value("name", ""), "count");
@@ -79,8 +53,8 @@ TEST(CliValues, InfoArgsAndLocalsListTheFrame) {
 }
 
 TEST(CliValues, InspectOpensOneLevelWithARangeAndDisplayMarksChanges) {
-  const std::vector<json> Lines = RunValues("inspect pt\ninspect many 100 3\ninspect nosuch\ndisplay count\nnext\nnext\n");
-  const std::vector<json> Inspects = All(Lines, "answer", "inspect");
+  const test::TCliRun Run = RunValues("inspect pt\ninspect many 100 3\ninspect nosuch\ndisplay count\nnext\nnext\n");
+  const std::vector<json> Inspects = Run.All("answer", "inspect");
   ASSERT_EQ(Inspects.size(), 3u);
   EXPECT_EQ(Inspects[0].value("count", 0), 2);
   EXPECT_EQ(Inspects[0]["children"][1].value("name", ""), "right");
@@ -91,7 +65,7 @@ TEST(CliValues, InspectOpensOneLevelWithARangeAndDisplayMarksChanges) {
   EXPECT_EQ(Inspects[1]["children"][1].value("name", ""), "101");
   EXPECT_EQ(Inspects[2].value("error", ""), "-var-create: unable to create variable object");
 
-  const std::vector<json> Displays = All(Lines, "event", "display");
+  const std::vector<json> Displays = Run.All("event", "display");
   ASSERT_EQ(Displays.size(), 3u) << "once when asked, then at each stop";
   EXPECT_EQ(Displays[0].value("value", ""), "5");
   EXPECT_FALSE(Displays[1].value("changed", true));

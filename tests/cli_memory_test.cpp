@@ -6,65 +6,28 @@
 #include <gtest/gtest.h>
 #include <nlohmann/json.hpp>
 
-#include <cstdio>
-#include <cstdlib>
-#include <fstream>
-#include <sstream>
 #include <string>
-#include <sys/wait.h>
 #include <vector>
 
 namespace midebug {
 namespace {
 
 using nlohmann::json;
-
-/// Where GDB loads a position-independent program (it turns address
-/// randomisation off).
-constexpr UInt64 LoadBase = 0x555555554000;
-
-/// The address of Symbol in Program once GDB has loaded it.
-UInt64 SymbolAddress(const std::string& Program, const std::string& Symbol) {
-  FILE* Listing = popen(("nm '" + Program + "'").c_str(), "r");
-  if (!Listing)
-    return 0;
-  char Line[512];
-  UInt64 Address = 0;
-  while (std::fgets(Line, sizeof Line, Listing)) {
-    std::istringstream Fields(Line);
-    std::string Offset, Kind, Name;
-    if (Fields >> Offset >> Kind >> Name && Name == Symbol)
-      Address = LoadBase + std::stoull(Offset, nullptr, 16);
-  }
-  pclose(Listing);
-  return Address;
-}
-
-std::string Hex(UInt64 Address) {
-  char Text[24];
-  std::snprintf(Text, sizeof Text, "0x%016llx", static_cast<unsigned long long>(Address));
-  return Text;
-}
+using test::Hex;
+using test::SymbolAddress;
 
 class CliMemory : public ::testing::Test {
 protected:
   /// The answers, in order, of `midebug --batch --json` on the memory
   /// program given Commands.
   std::vector<json> Answers(const std::string& Commands) {
-    const std::string Input = Scratch.WriteFile("commands.txt", Commands);
-    const std::string Output = Scratch.Path() + "/stdout.txt";
-    const std::string Command = std::string("'") + MIDEBUG_CLI + "' --batch --json --wait 20 '" + Program + "' < '" +
-                                Input + "' > '" + Output + "' 2>/dev/null";
+    const test::TCliRun Run = test::RunCli(Scratch, test::Quote(Program), Commands);
     // Each script ends with commands that fail: batch mode then exits 3.
-    const int Status = std::system(Command.c_str());
-    EXPECT_TRUE(WIFEXITED(Status) && WEXITSTATUS(Status) == 3) << Status;
-    std::ifstream Stream(Output);
+    EXPECT_EQ(Run.ExitCode, 3) << Run.Stderr;
     std::vector<json> Found;
-    for (std::string Line; std::getline(Stream, Line);) {
-      json Object = json::parse(Line, nullptr, false);
-      if (!Object.is_discarded() && Object.contains("answer") && Object["answer"] != "start")
-        Found.push_back(std::move(Object));
-    }
+    for (const json& Object : Run.Lines)
+      if (Object.contains("answer") && Object["answer"] != "start")
+        Found.push_back(Object);
     return Found;
   }
 

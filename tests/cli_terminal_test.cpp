@@ -124,10 +124,8 @@ TEST(CliOnTerminal, AnAttachedProgramOutlivesQuitAndTerminationSignals) {
   // and SIGHUP sent to midebug alone.
   for (const int Ending : {0, SIGTERM, SIGHUP}) {
     SCOPED_TRACE(Ending);
-    FILE* Shell = popen(("exec '" + Debuggee("sleeper") + "' >/dev/null 2>&1 & echo $!").c_str(), "r");
-    int Pid = 0;
-    ASSERT_EQ(std::fscanf(Shell, "%d", &Pid), 1);
-    pclose(Shell);
+    const int Pid = test::StartDebuggee("sleeper");
+    ASSERT_NE(Pid, 0);
     const std::shared_ptr<void> KillAtEnd(nullptr, [Pid](void*) { kill(Pid, SIGKILL); });
     TCliOnTerminal Cli({"--attach", std::to_string(Pid)});
     ASSERT_TRUE(Cli.WaitFor("(midebug) ")) << Cli.Seen();

@@ -7,15 +7,10 @@
 #include <gtest/gtest.h>
 #include <nlohmann/json.hpp>
 
-#include <cstdlib>
 #include <filesystem>
-#include <fstream>
-#include <functional>
 #include <regex>
-#include <sstream>
 #include <string>
 #include <signal.h>
-#include <sys/wait.h>
 #include <vector>
 
 namespace midebug {
@@ -23,96 +18,19 @@ namespace {
 
 using nlohmann::json;
 using test::Debuggee;
-using test::TScratchDir;
-
-/// The generous limit, in seconds, a resuming command waits for a stop;
-/// only reached when the program never stops.
-const char* const WaitLimit = "20";
-
-/// What one run of the console debugger printed and how it ended.
-struct TCliRun {
-  std::vector<json> Lines;
-  std::string Stdout;
-  std::string Stderr;
-  int ExitCode = -1;
-
-  /// The first object for which Match holds, or null.
-  const json* Find(const std::function<bool(const json&)>& Match) const {
-    for (const json& Line : Lines)
-      if (Match(Line))
-        return &Line;
-    return nullptr;
-  }
-  const json* Event(const std::string& Name) const {
-    return Find([&](const json& Line) { return Line.value("event", "") == Name; });
-  }
-  const json* Answer(const std::string& Name) const {
-    return Find([&](const json& Line) { return Line.value("answer", "") == Name; });
-  }
-  std::vector<json> Events(const std::string& Name) const {
-    std::vector<json> Found;
-    for (const json& Line : Lines)
-      if (Line.value("event", "") == Name)
-        Found.push_back(Line);
-    return Found;
-  }
-  /// Everything the program printed, joined.
-  std::string Output() const {
-    std::string Text;
-    for (const json& Line : Events("output"))
-      if (Line.value("kind", "") == "output")
-        Text += Line.value("text", "");
-    return Text;
-  }
-};
-
-std::string ReadAll(const std::string& Path) {
-  std::ifstream Stream(Path);
-  return std::string((std::istreambuf_iterator<char>(Stream)), std::istreambuf_iterator<char>());
-}
-
-std::string Quote(const std::string& Text) { return "'" + Text + "'"; }
+using test::Quote;
+using test::TCliRun;
 
 class CliTest : public ::testing::Test {
 protected:
-  /// Runs `midebug --batch --json --wait LIMIT Arguments` with Commands on
-  /// its standard input (without --json for the text a person reads).
   TCliRun RunCli(const std::string& Arguments, const std::string& Commands, bool Json = true) {
-    const std::string Input = Scratch.WriteFile("commands.txt", Commands);
-    const std::string Output = Scratch.Path() + "/stdout.txt";
-    const std::string Errors = Scratch.Path() + "/stderr.txt";
-    const std::string Command = "cd " + Quote(Scratch.Path()) + " && " + Quote(MIDEBUG_CLI) +
-                                " --batch " + (Json ? "--json " : "") + "--wait " + WaitLimit + " " + Arguments + " < " + Quote(Input) +
-                                " > " + Quote(Output) + " 2> " + Quote(Errors);
-    TCliRun Run;
-    const int Status = std::system(Command.c_str());
-    Run.ExitCode = WIFEXITED(Status) ? WEXITSTATUS(Status) : -1;
-    Run.Stdout = ReadAll(Output);
-    Run.Stderr = ReadAll(Errors);
-    std::istringstream Lines(Run.Stdout);
-    for (std::string Line; Json && std::getline(Lines, Line);) {
-      json Object = json::parse(Line, nullptr, false);
-      EXPECT_FALSE(Object.is_discarded()) << "not JSON: " << Line;
-      if (!Object.is_discarded())
-        Run.Lines.push_back(std::move(Object));
-    }
-    return Run;
+    return test::RunCli(Scratch, Arguments, Commands, Json);
   }
-
-  TScratchDir Scratch;
+  test::TScratchDir Scratch;
 };
 
 /// The line of tests/debuggees/loop.c that holds Marker.
-int LineOf(const std::string& Marker) {
-  std::istringstream Lines(ReadAll(test::DebuggeeSource("loop.c")));
-  int Number = 0;
-  for (std::string Line; std::getline(Lines, Line);) {
-    ++Number;
-    if (Line.find(Marker) != std::string::npos)
-      return Number;
-  }
-  return -1;
-}
+Integer LineOf(const std::string& Marker) { return test::LineOf("loop.c", Marker); }
 
 std::string FileName(const json& Object) {
   return std::filesystem::path(Object.value("file", std::string())).filename().string();
@@ -144,13 +62,8 @@ TEST_F(CliTest, CliCommandsThatCannotRunSayWhyAndTheSessionGoesOn) {
 // --- Attaching -----------------------------------------------------------------
 
 TEST_F(CliTest, CliAttachShowsTheStackAndDetachLeavesTheProgramRunning) {
-  const std::string Program = Debuggee("sleeper");
-  const std::string Start = "exec " + Quote(Program) + " >/dev/null 2>&1 & echo $!";
-  FILE* Shell = popen(Start.c_str(), "r");
-  ASSERT_NE(Shell, nullptr);
-  int Pid = 0;
-  ASSERT_EQ(std::fscanf(Shell, "%d", &Pid), 1);
-  pclose(Shell);
+  const int Pid = test::StartDebuggee("sleeper");
+  ASSERT_NE(Pid, 0);
   const TCliRun Run = RunCli("--attach " + std::to_string(Pid), "bt\ndetach\n");
   const bool StillRunning = kill(Pid, 0) == 0;
   kill(Pid, SIGKILL);
@@ -181,23 +94,20 @@ TEST_F(CliTest, CliSteppingNextStepAndFinishFollowTheSource) {
   ASSERT_NE(Loaded, nullptr) << Run.Stdout;
   EXPECT_EQ((*Loaded)["program"], Program);
   EXPECT_EQ((*Loaded)["language"], "c");
-  std::vector<const json*> Stops;
-  for (const json& Line : Run.Lines)
-    if (Line.value("event", "") == "stopped")
-      Stops.push_back(&Line);
+  const std::vector<json> Stops = Run.All("event", "stopped");
   ASSERT_EQ(Stops.size(), 5u) << Run.Stdout << Run.Stderr;
-  EXPECT_EQ((*Stops[0])["reason"], "breakpoint");
-  EXPECT_EQ((*Stops[0])["line"], LineOf("main-first"));
-  EXPECT_NE((*Stops[0]).value("text", "").find("main-first"), std::string::npos);
-  EXPECT_EQ((*Stops[1])["line"], LineOf("main-loop"));
-  EXPECT_EQ((*Stops[1])["reason"], "step");
-  EXPECT_EQ((*Stops[2])["line"], LineOf("main-call"));
-  EXPECT_EQ((*Stops[3])["line"], LineOf("square-body"));
+  EXPECT_EQ(Stops[0]["reason"], "breakpoint");
+  EXPECT_EQ(Stops[0]["line"], LineOf("main-first"));
+  EXPECT_NE(Stops[0].value("text", "").find("main-first"), std::string::npos);
+  EXPECT_EQ(Stops[1]["line"], LineOf("main-loop"));
+  EXPECT_EQ(Stops[1]["reason"], "step");
+  EXPECT_EQ(Stops[2]["line"], LineOf("main-call"));
+  EXPECT_EQ(Stops[3]["line"], LineOf("square-body"));
   // Out of square, back in main's loop line.
-  EXPECT_EQ(FileName(*Stops[4]), "loop.c");
-  EXPECT_EQ((*Stops[4])["line"], LineOf("main-call"));
-  EXPECT_EQ((*Stops[4])["returned"], "1") << "square(1)";
-  EXPECT_FALSE(Stops[3]->contains("returned"));
+  EXPECT_EQ(FileName(Stops[4]), "loop.c");
+  EXPECT_EQ(Stops[4]["line"], LineOf("main-call"));
+  EXPECT_EQ(Stops[4]["returned"], "1") << "square(1)";
+  EXPECT_FALSE(Stops[3].contains("returned"));
 
   const json* Backtrace = Run.Answer("bt");
   ASSERT_NE(Backtrace, nullptr);
@@ -228,7 +138,7 @@ TEST_F(CliTest, CliProgramGetsItsArgumentsExactlyAndEmptyOrChosenInput) {
   EXPECT_EQ(Echoed.Output(), "[$HOME]\n[*]\n[x;y]\n[$(touch " + Marker + ")]\n[two\nlines]\n[]\n[end]\n");
   EXPECT_FALSE(std::filesystem::exists(Marker));
   // Every address is a hex string, a module's base too.
-  const std::vector<json> Modules = Echoed.Events("module-loaded");
+  const std::vector<json> Modules = Echoed.All("event", "module-loaded");
   ASSERT_FALSE(Modules.empty()) << Echoed.Stdout;
   EXPECT_TRUE(Modules.front()["base"].get<std::string>().starts_with("0x")) << Modules.front();
 
@@ -252,7 +162,7 @@ TEST_F(CliTest, CliEndsAreReportedAsTheyHappenAndTheProgramRunsAgain) {
   const TCliRun Again =
       RunCli("--debugger /usr/bin/gdb --no-thread-events " + Quote(Relative), "start\nkill\nrun\nstart\ncontinue\n");
   EXPECT_EQ(Again.ExitCode, 0) << Again.Stderr;
-  const std::vector<json> Ends = Again.Events("exited");
+  const std::vector<json> Ends = Again.All("event", "exited");
   ASSERT_EQ(Ends.size(), 3u) << Again.Stdout;
   EXPECT_EQ(Ends[0], json({{"event", "exited"}, {"reason", "killed"}}));
   EXPECT_EQ(Ends[1], json({{"event", "exited"}, {"reason", "exited"}, {"code", 3}}));
@@ -306,13 +216,7 @@ TEST_F(CliTest, CliBacktraceOfADeepStackReadsLikeGdbsAndReachesEveryFrame) {
   EXPECT_TRUE(std::regex_search(Run.Stdout, std::regex("\n#22  " + Frame + "\n"))) << Run.Stdout;
 }
 
-} // namespace
-} // namespace midebug
-
 // --- Source lines -------------------------------------------------------------
-
-namespace midebug {
-namespace {
 
 // tests/debuggees/sourcelines.c: main runs from line 4 to 12, below is at
 // lines 13 to 15.
@@ -320,14 +224,7 @@ TEST_F(CliTest, CliListsSourceShowsALinesCodeAndMovesTheNextStatement) {
   const std::string Program = Quote(Debuggee("sourcelines"));
   const TCliRun Run = RunCli(Program, "list below\nstart\ninfo line sourcelines.c:9\nlist\njump 14\njump 10\n"
                                       "next\ninfo line *0x1\nlist nosuch\njump x\n");
-  const auto Answers = [&](const std::string& Name) {
-    std::vector<json> Found;
-    for (const json& Line : Run.Lines)
-      if (Line.value("answer", "") == Name)
-        Found.push_back(Line);
-    return Found;
-  };
-  const std::vector<json> Lists = Answers("list");
+  const std::vector<json> Lists = Run.All("answer", "list");
   ASSERT_EQ(Lists.size(), 3u) << Run.Stdout;
   EXPECT_EQ(Lists[0]["lines"].front()["line"], 8) << "five lines before below's first line";
   EXPECT_EQ(Lists[0]["lines"].back()["line"], 15) << "to the end of the file";
@@ -338,7 +235,7 @@ TEST_F(CliTest, CliListsSourceShowsALinesCodeAndMovesTheNextStatement) {
   EXPECT_EQ(AtStart[4]["text"], "  int total = 0;");
   EXPECT_EQ(Lists[2]["error"], "no function or line 'nosuch'");
 
-  const std::vector<json> Infos = Answers("info line");
+  const std::vector<json> Infos = Run.All("answer", "info line");
   ASSERT_EQ(Infos.size(), 2u) << Run.Stdout;
   EXPECT_EQ(Infos[0]["line"], 9);
   EXPECT_EQ(FileName(Infos[0]), "sourcelines.c");
@@ -346,7 +243,7 @@ TEST_F(CliTest, CliListsSourceShowsALinesCodeAndMovesTheNextStatement) {
             std::stoull(Infos[0]["end"].get<std::string>(), nullptr, 16));
   EXPECT_TRUE(Infos[1].contains("error")) << Infos[1];
 
-  const std::vector<json> Jumps = Answers("jump");
+  const std::vector<json> Jumps = Run.All("answer", "jump");
   ASSERT_EQ(Jumps.size(), 3u) << Run.Stdout;
   EXPECT_EQ(Jumps[0]["error"], "cannot move to line 14: it is not in the current function");
   EXPECT_EQ(Jumps[1]["line"], 10);

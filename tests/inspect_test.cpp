@@ -146,14 +146,6 @@ TEST_F(InspectInC, TheLocalsViewOfTwoHundredLocalsIsRebuiltWhenTheFrameChanges) 
   EXPECT_EQ(Members(Locals), (Strings{"origin={...}"})) << "the innermost frame is main's now";
 }
 
-} // namespace
-} // namespace midebug
-
-namespace midebug {
-namespace {
-
-using Strings = std::vector<std::string>;
-
 /// tests/debuggees/cppvalues.cpp, first before its containers are built,
 /// then once they hold their values.
 class InspectInCpp : public test::ValueSession {
@@ -199,14 +191,6 @@ TEST_F(InspectInCpp, AClassShowsItsBasesAndItsMembersUnderTheirAccessGroups) {
   EXPECT_EQ(Members(Named->CreateSubInspector(iiVariable, 0)), (Strings{"label=\"shape\""}));
 }
 
-} // namespace
-} // namespace midebug
-
-namespace midebug {
-namespace {
-
-using Strings = std::vector<std::string>;
-
 /// tests/debuggees/pasvalues.pas stopped in Total, whose parameter is an
 /// open array, built with the default debug format and with DWARF 3.
 class InspectInPascal : public test::ValueSession, public ::testing::WithParamInterface<const char*> {
@@ -226,15 +210,15 @@ TEST_P(InspectInPascal, EveryKindOfValueShowsWithoutKillingGdb) {
       {"Ansi", "'ansi text'"}, {"Wide", "'wide text'"}, {"Pair", "{Left = 1, Right = 2}"}, {"Shape", "0x"},
       {"Colours", "[Red, Blue]"}, {"Colour", "Green"}, {"Index", ""}, {"Fixed[2]", "22"},
   };
+  const auto Upper = [](std::string Text) {
+    for (char& Letter : Text)
+      Letter = static_cast<char>(std::toupper(static_cast<unsigned char>(Letter)));
+    return Text;
+  };
   for (const auto& Case : Cases) {
-    std::string Value = Eval(Case.Expr);
+    const std::string Value = Eval(Case.Expr);
     EXPECT_FALSE(Value.starts_with("error:")) << Case.Expr << ": " << Value;
-    for (char& Letter : Value)
-      Letter = static_cast<char>(std::toupper(static_cast<unsigned char>(Letter)));
-    std::string Expected = Case.Value;
-    for (char& Letter : Expected)
-      Letter = static_cast<char>(std::toupper(static_cast<unsigned char>(Letter)));
-    EXPECT_NE(Value.find(Expected), std::string::npos) << Case.Expr << ": " << Value;
+    EXPECT_NE(Upper(Value).find(Upper(Case.Value)), std::string::npos) << Case.Expr << ": " << Value;
 
     const TIntfPtr<IGDBInspect> Inspector = Thread()->CreateInspector(Case.Expr, 1);
     for (Integer Index = 0; Index < std::min(Inspector->GetMemberCount(), 3); ++Index) {
@@ -254,22 +238,12 @@ TEST_P(InspectInPascal, EveryKindOfValueShowsWithoutKillingGdb) {
 
 INSTANTIATE_TEST_SUITE_P(DebugFormats, InspectInPascal, ::testing::Values("pasvalues", "pasvalues-gw3"));
 
-} // namespace
-} // namespace midebug
-
-namespace midebug {
-namespace {
-
-using Strings = std::vector<std::string>;
-
 /// tests/debuggees/values.c under LLDB's real MI front end, where it runs.
 class InspectOnLLDB : public test::ValueSession {
 protected:
   void SetUp() override {
     ValueSession::SetUp();
-    std::string WhyNot;
-    const std::string LLDB = test::LLDBMIPath(WhyNot);
-    if (LLDB.empty())
+    if (!FindLLDB())
       GTEST_SKIP() << WhyNot;
     Process = TGDBProcessManager::CreateProcess(Listener, test::Debuggee("values"), "", "", "local", "Linux64", glC,
                                                 gcAMD64, LLDB);

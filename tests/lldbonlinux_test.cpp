@@ -3,14 +3,9 @@
 // the program's output, the state of paused threads) reaches the IDE as it
 // is.
 
-#include "midebug.h"
-#include "testlistener.h"
-#include "testsupport.h"
-
-#include <gtest/gtest.h>
+#include "breakpointtesting.h"
 
 #include <csignal>
-#include <cstdio>
 #include <filesystem>
 #include <string>
 
@@ -18,20 +13,13 @@ namespace midebug {
 namespace {
 
 using test::Debuggee;
-using test::TTestListener;
 
-class LLDBOnLinux : public ::testing::Test {
+class LLDBOnLinux : public test::TDebugFixture {
 protected:
   void SetUp() override {
-    SetMainThread();
-    std::string WhyNot;
-    LLDB = test::LLDBMIPath(WhyNot);
-    if (LLDB.empty())
+    TDebugFixture::SetUp();
+    if (!FindLLDB())
       GTEST_SKIP() << WhyNot;
-  }
-  void TearDown() override {
-    Process = nullptr;
-    ProcessPending();
   }
   void Launch(const std::string& Program, const std::string& Arguments = "") {
     Process = TGDBProcessManager::CreateProcess(Listener, Debuggee(Program), Arguments, Scratch.Path(), "local",
@@ -39,10 +27,6 @@ protected:
     ASSERT_TRUE(Process);
   }
 
-  std::string LLDB;
-  test::TScratchDir Scratch;
-  TIntfPtr<TTestListener> Listener{new TTestListener};
-  TIntfPtr<IGDBProcess> Process;
 };
 
 TEST_F(LLDBOnLinux, ExitCodeIsTheOneTheProgramReturned) {
@@ -86,12 +70,8 @@ TEST_F(LLDBOnLinux, EveryThreadOfAPausedProgramIsStopped) {
 }
 
 TEST_F(LLDBOnLinux, TheLocalProfileAttachesWithTheDebuggerNamedAndDetachLeavesTheProgram) {
-  const std::string Start = "exec '" + Debuggee("sleeper") + "' >/dev/null 2>&1 & echo $!";
-  FILE* Shell = popen(Start.c_str(), "r");
-  ASSERT_NE(Shell, nullptr);
-  int Pid = 0;
-  ASSERT_EQ(std::fscanf(Shell, "%d", &Pid), 1);
-  pclose(Shell);
+  const int Pid = test::StartDebuggee("sleeper");
+  ASSERT_NE(Pid, 0);
   Process = TGDBProcessManager::AttachProcess(Listener, Pid, "local", "Linux64", glC, gcAMD64, LLDB);
   ASSERT_TRUE(Process);
   ASSERT_TRUE(Listener->PumpUntilCall("Suspended("));

@@ -174,14 +174,11 @@ TEST_F(MemoryInC, WritesReachTheProgramAndTheNextDisassembly) {
 class MemoryOnLLDB : public test::StoppedProgram {
 protected:
   void SetUp() override {
-    std::string WhyNot;
-    LLDB = test::LLDBMIPath(WhyNot);
-    if (LLDB.empty())
+    if (!FindLLDB())
       GTEST_SKIP() << WhyNot;
     StoppedProgram::SetUp();
     ASSERT_NO_FATAL_FAILURE(Launch(test::Debuggee("memory"), glC, {"inspect_stack"}, LLDB));
   }
-  std::string LLDB;
 };
 
 TEST_F(MemoryOnLLDB, MemoryCursorAndRegisterWritesWork) {

@@ -1,7 +1,8 @@
 #pragma once
 /// \file
 /// A process that ignores every notification and answers every question with
-/// a plain default, to derive parser drivers from (fuzzing, benchmarks).
+/// a plain default, to derive parser drivers from (fuzzing, benchmarks, the
+/// recording process of the parser tests).
 
 #include "midebug.h"
 

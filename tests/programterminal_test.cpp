@@ -3,11 +3,8 @@
 // output and never as the debugger's records, ahead of the stop or exit that
 // follows it; its standard streams are a terminal, not GDB's pipes.
 
-#include "midebug.h"
-#include "testlistener.h"
-#include "testsupport.h"
+#include "breakpointtesting.h"
 
-#include <gtest/gtest.h>
 #include <unistd.h>
 
 #include <fstream>
@@ -17,23 +14,9 @@ namespace midebug {
 namespace {
 
 using test::Debuggee;
-using test::TScratchDir;
-using test::TTestListener;
 
-class ProgramTerminal : public ::testing::Test {
+class ProgramTerminal : public test::TDebugFixture {
 protected:
-  void SetUp() override { SetMainThread(); }
-  void TearDown() override {
-    Process = nullptr;
-    ProcessPending();
-  }
-
-  void Launch(const std::string& Program, const std::string& Arguments = "") {
-    ASSERT_FALSE(Program.empty());
-    Process = TGDBProcessManager::CreateProcess(Listener, Program, Arguments, Scratch.Path(), "local", "Linux64", glC,
-                                                gcAMD64, "gdb");
-    ASSERT_TRUE(Process);
-  }
   /// The program output the IDE heard before the Count-th call starting
   /// with Prefix (all of it when there is no such call), in order.
   std::string OutputBefore(const std::string& Prefix, size_t Count = 1) {
@@ -47,10 +30,6 @@ protected:
     }
     return Output;
   }
-
-  TScratchDir Scratch;
-  TIntfPtr<TTestListener> Listener{new TTestListener};
-  TIntfPtr<IGDBProcess> Process;
 };
 
 TEST_F(ProgramTerminal, OutputLikeRecordsIsDeliveredIntactBeforeTheRealExitCode) {
@@ -65,10 +44,7 @@ TEST_F(ProgramTerminal, OutputLikeRecordsIsDeliveredIntactBeforeTheRealExitCode)
 }
 
 TEST_F(ProgramTerminal, OutputOfASteppedOverCallArrivesWholeBeforeTheStop) {
-  Launch(Debuggee("printlines"));
-  ASSERT_TRUE(Process->SetRunToMainBreakpoint());
-  Process->Run();
-  ASSERT_TRUE(Listener->PumpUntilCall("Suspended("));
+  ASSERT_NO_FATAL_FAILURE(LaunchToMain(Debuggee("printlines")));
   EXPECT_EQ(OutputBefore("Suspended("), "");
   Process->GetThread(Process->GetSuspendedThreadId())->StepOver();
   ASSERT_TRUE(Listener->PumpUntil([&] { return Listener->CountOf("Suspended(") == 2; }));
@@ -82,7 +58,7 @@ TEST_F(ProgramTerminal, OutputOfASteppedOverCallArrivesWholeBeforeTheStop) {
 }
 
 TEST_F(ProgramTerminal, ProgramWaitingForInputLeavesTheSessionFreeToPauseAndEnd) {
-  Launch(Debuggee("terminal"), "read");
+  Launch(Debuggee("terminal"), glC, "read");
   Process->Run();
   ASSERT_TRUE(Listener->PumpUntil([&] { return OutputBefore("Exited(").find("waiting for input\n") == 0; }));
   Process->Pause();
@@ -102,7 +78,7 @@ TEST_F(ProgramTerminal, EachQuotedArgumentArrivesExactlyAndNothingRunsInTheShell
   const std::string Injected = Scratch.Path() + "/INJECTED";
   const TStringArray Arguments = {"$HOME", "*", "x;y", "it's", "\"q w\"", "back\\slash", "two\nlines", "",
                                   "h\xc3\xa9llo \xe2\x82\xac", "$(touch${IFS}" + Injected + ")", "a b"};
-  Launch(Debuggee("argsecho"), QuoteProgramArguments(Arguments, false));
+  Launch(Debuggee("argsecho"), glC, QuoteProgramArguments(Arguments, false));
   Process->Run();
   ASSERT_TRUE(Listener->PumpUntilCall("Exited(0,"));
   std::string Expected;
@@ -113,9 +89,7 @@ TEST_F(ProgramTerminal, EachQuotedArgumentArrivesExactlyAndNothingRunsInTheShell
 }
 
 TEST_F(ProgramTerminal, LLDBKeepsEachArgumentWholeAndTheOutputIsProgramOutput) {
-  std::string WhyNot;
-  const std::string LLDB = test::LLDBMIPath(WhyNot);
-  if (LLDB.empty())
+  if (!FindLLDB())
     GTEST_SKIP() << WhyNot;
   const TStringArray Arguments = {"$HOME", "*", "x;y", "it's", "\"q w\"", "", "a b", "back\\slash",
                                   "h\xc3\xa9llo \xe2\x82\xac"};

@@ -4,6 +4,7 @@
 /// line of text, keeps the values of the calls a user would see, and hands
 /// out the result objects a test registered.
 
+#include "nullprocess.h"
 #include "process/gdbinterfaces.h"
 
 #include <algorithm>
@@ -22,7 +23,7 @@ struct TStop {
   TThreadStopReason Reason = tsrNotStopped;
 };
 
-class TRecordingProcess : public IGDBInternalProcess {
+class TRecordingProcess : public TNullInternalProcess {
 public:
   // What the process answers.
   bool LLDB = false;
@@ -49,10 +50,6 @@ public:
   bool Called(std::string_view Prefix) const {
     return std::any_of(Calls.begin(), Calls.end(), [&](const std::string& Call) { return Call.starts_with(Prefix); });
   }
-
-  int32_t QueryInterface(const TGUID&, void**) override { return IntfResultNoInterface; }
-  int32_t AddRef() override { return 1; }
-  int32_t Release() override { return 1; }
 
   void NotifyLogEvent(const TGDBLogEvent& Event) override {
     Record("Log", std::to_string(static_cast<int>(Event.Event)) + "," + Event.Data);
@@ -110,10 +107,6 @@ public:
   }
   std::string GetEndOfLineMarker() override { return EndOfLineMarker; }
   bool IsLLDB() override { return LLDB; }
-  bool IsAndroid64() override { return false; }
-  bool IsLinux() override { return true; }
-  bool IsWindows() override { return false; }
-  bool IsAttachMode() override { return false; }
   bool SupportHXConsole() override { return HXConsole; }
   bool IsDying() override { return Dying; }
   Integer GetModuleId(const std::string& Name) override {

@@ -22,7 +22,6 @@ using test::ProcessRuns;
 using test::TFakeOnPath;
 using test::TTestListener;
 
-TGDBProcess& ProcessOf(const TIntfPtr<IGDBProcess>& Process) { return *static_cast<TGDBProcess*>(Process.get()); }
 
 /// Keeps the modules the IDE heard of, and what GetModule answered for each
 /// while it was being delivered.
@@ -90,7 +89,7 @@ TEST_P(RunControlToMain, StopsAtMainAsABreakpointStopAndLearnsTheLanguage) {
   ASSERT_TRUE(Listener->PumpUntilCall("Exited("));
   EXPECT_TRUE(Listener->HasCall("Exited(0,)"));
   EXPECT_EQ(Listener->CountOf("Exited("), 1u);
-  EXPECT_FALSE(ProcessOf(Process).Alive());
+  EXPECT_FALSE(Core().Alive());
   EXPECT_TRUE(ReleaseAndCheckDebuggerGone());
   EXPECT_FALSE(ProcessRuns(Pid));
 }
@@ -102,10 +101,7 @@ INSTANTIATE_TEST_SUITE_P(RunControlLanguages, RunControlToMain,
                          [](const ::testing::TestParamInfo<TMainCase>& Info) { return std::string(Info.param.Program); });
 
 TEST_F(RunControl, StepsReachTheListenerWithThreadLocationAndReason) {
-  Launch(Debuggee("stepping"));
-  ASSERT_TRUE(Process->SetRunToMainBreakpoint());
-  Process->Run();
-  ASSERT_TRUE(NextStop());
+  ASSERT_NO_FATAL_FAILURE(LaunchToMain(Debuggee("stepping")));
   EXPECT_EQ(StopLocation().Line, MainFirstLine);
   const TIntfPtr<IGDBThread> Thread = Process->GetThread(Process->GetSuspendedThreadId());
 
@@ -147,10 +143,7 @@ TEST_F(RunControl, StepsReachTheListenerWithThreadLocationAndReason) {
 }
 
 TEST_F(RunControl, AStepTheDebuggerRefusesIsReportedAndStopsAgainWhereItWas) {
-  Launch(Debuggee("stepping"));
-  ASSERT_TRUE(Process->SetRunToMainBreakpoint());
-  Process->Run();
-  ASSERT_TRUE(NextStop());
+  ASSERT_NO_FATAL_FAILURE(LaunchToMain(Debuggee("stepping")));
   const TGDBLocation AtMain = StopLocation();
   // Compiled as "gcc stepping.c": the location names the file by its path.
   EXPECT_EQ(AtMain.Source, test::DebuggeeSource("stepping.c"));
@@ -167,10 +160,7 @@ TEST_F(RunControl, AStepTheDebuggerRefusesIsReportedAndStopsAgainWhereItWas) {
 }
 
 TEST_F(RunControl, ADebuggerThatDiesWhileTheProgramIsStoppedIsReportedAtOnce) {
-  Launch(Debuggee("stepping"));
-  ASSERT_TRUE(Process->SetRunToMainBreakpoint());
-  Process->Run();
-  ASSERT_TRUE(NextStop());
+  ASSERT_NO_FATAL_FAILURE(LaunchToMain(Debuggee("stepping")));
   const std::vector<int> Debuggers = test::ChildrenNamed("gdb");
   ASSERT_EQ(Debuggers.size(), 1u);
   kill(Debuggers[0], SIGKILL);
@@ -199,7 +189,7 @@ TEST_F(RunControl, PauseOfABusyLoopIsAStepStopAndResumeContinues) {
 
   Process->Resume();
   ASSERT_TRUE(Listener->PumpUntilCall("Resumed(1)"));
-  EXPECT_FALSE(ProcessOf(Process).Suspended());
+  EXPECT_FALSE(Core().Suspended());
   Process->Pause();
   ASSERT_TRUE(NextStop());
   EXPECT_FALSE(Listener->HasCall("Signal("));
@@ -227,10 +217,7 @@ TEST_F(RunControl, TerminateOfARunningProgramEndsProgramAndDebugger) {
 }
 
 TEST_F(RunControl, ThreadsStartedAndJoinedAreReported) {
-  Launch(Debuggee("workers"));
-  ASSERT_TRUE(Process->SetRunToMainBreakpoint());
-  Process->Run();
-  ASSERT_TRUE(NextStop());
+  ASSERT_NO_FATAL_FAILURE(LaunchToMain(Debuggee("workers")));
   Process->Resume();
   ASSERT_TRUE(Listener->PumpUntilCall("Exited(6,"));
   EXPECT_TRUE(Listener->HasCall("ThreadCreated(2)"));
@@ -310,13 +297,8 @@ TEST_F(RunControl, LoadedAndUnloadedModulesReachTheListenerAndSetTheBaseAddress)
 
 // --- The scripted fake debugger -------------------------------------------------
 
-class RunControlFake : public ::testing::Test {
+class RunControlFake : public test::TDebugFixture {
 protected:
-  void SetUp() override { SetMainThread(); }
-  void TearDown() override {
-    Process = nullptr;
-    ProcessPending();
-  }
   /// Starts a process on the fake GDB playing the script Name and runs it.
   void Run(const std::string& Name) {
     Fake.reset();
@@ -328,8 +310,6 @@ protected:
   }
 
   std::unique_ptr<TFakeOnPath> Fake;
-  TIntfPtr<TTestListener> Listener{new TTestListener};
-  TIntfPtr<IGDBProcess> Process;
 };
 
 TEST_F(RunControlFake, ThreadBurstIsOneDeliveryLatestThreadFirst) {
@@ -340,7 +320,7 @@ TEST_F(RunControlFake, ThreadBurstIsOneDeliveryLatestThreadFirst) {
   ASSERT_EQ(ProcessPending(), 0u);
 
   TStackInfoDepthResult Depth;
-  ASSERT_TRUE(ProcessOf(Process).ProcessSyncRequest("0300000000901", "0300000000901-stack-info-depth", Depth));
+  ASSERT_TRUE(Core().ProcessSyncRequest("0300000000901", "0300000000901-stack-info-depth", Depth));
   ASSERT_FALSE(Depth.FError);
   EXPECT_EQ(ProcessPending(), 1u);
   const std::vector<std::string> Calls = Listener->Calls();
@@ -370,7 +350,7 @@ TEST_F(RunControlFake, SilentStopsAndFaultsEndInTheExit) {
     EXPECT_FALSE(Listener->HasCall("Signal("));
     EXPECT_FALSE(Listener->HasCall("Suspended("));
     EXPECT_FALSE(Listener->HasCall("Resumed("));
-    EXPECT_FALSE(ProcessOf(Process).Alive());
+    EXPECT_FALSE(Core().Alive());
     TearDown();
   }
 }
@@ -383,7 +363,7 @@ TEST_F(RunControlFake, LaunchRefusedBeforeAProcessIdEndsTheSessionAndSaysWhy) {
   } catch (const ENonAIRException& Error) {
     EXPECT_STREQ(Error.what(), "Unable to create process: 'During startup program exited with code 126.'");
   }
-  EXPECT_FALSE(ProcessOf(Process).Alive());
+  EXPECT_FALSE(Core().Alive());
   ProcessPending();
   EXPECT_TRUE(Listener->HasCall("Exited(-1,During startup program exited with code 126.)"));
 }

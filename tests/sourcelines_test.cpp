@@ -4,13 +4,8 @@
 // debugger can show (a Windows target's line table read in chunks).
 
 #include "inspect/gdbfiletable.h"
-#include "midebug.h"
 #include "platform/hostfiles.h"
-#include "process/gdbprocess.h"
-#include "testlistener.h"
-#include "testsupport.h"
-
-#include <gtest/gtest.h>
+#include "stoppedprogram.h"
 
 #include <filesystem>
 #include <set>
@@ -18,7 +13,6 @@
 namespace midebug {
 namespace {
 
-using test::TTestListener;
 using TIntegerSet = std::set<Integer>;
 
 TEST(SourceLinesFileTable, OneIndexPerFileHoweverItsPathIsWritten) {
@@ -54,9 +48,8 @@ TEST(SourceLinesFileTable, WindowsTargetsSpellPathsWithBackslashesAndFallBackOnB
 
 /// A program stopped under GDB, whose traffic is logged so that the lines
 /// sent can be counted.
-class SourceLinesTest : public ::testing::Test {
+class SourceLinesTest : public test::StoppedProgram {
 protected:
-  void SetUp() override { SetMainThread(); }
   void TearDown() override {
     Process = nullptr;
     ProcessPending();
@@ -83,13 +76,10 @@ protected:
     const size_t Before = Listener->CountOf(Call);
     ASSERT_TRUE(Listener->PumpUntil([&] { return Listener->CountOf(Call) > Before; })) << "no " << Call;
   }
-  TGDBProcess& Core() { return *static_cast<TGDBProcess*>(Process.get()); }
   TGDBLocation Stop() { return Process->GetSuspendedLocation(); }
   /// The file index of the stop's source, added as the IDE adds it.
   Integer StopFileIndex() { return Process->GetThread(Process->GetSuspendedThreadId())->GetFileIndex(Stop().Source); }
 
-  TIntfPtr<TTestListener> Listener{new TTestListener};
-  TIntfPtr<IGDBProcess> Process;
   test::TScratchDir Logs;
   test::TScopedEnv Debug{"GDB_DEBUG", "1"};
   test::TScopedEnv Where{"GDB_OUTDIR", Logs.Path()};
@@ -252,9 +242,7 @@ TEST_F(SourceLinesTest, AWindowsTargetsTablesComeInChunksAndByBareName) {
 }
 
 TEST_F(SourceLinesTest, LLDBsFrontEndListsLinesAndMovesTheNextStatement) {
-  std::string WhyNot;
-  const std::string LLDB = test::LLDBMIPath(WhyNot);
-  if (LLDB.empty())
+  if (!FindLLDB())
     GTEST_SKIP() << WhyNot;
   Process = TGDBProcessManager::CreateProcess(Listener, test::Debuggee("sourcelines"), "", Logs.Path(), "local",
                                               "Linux64", glC, gcAMD64, LLDB);

@@ -1,8 +1,8 @@
 #pragma once
 /// \file
 /// A program stopped under the real GDB through the "local" profile, for the
-/// memory and register tests: launch to a breakpoint, continue, evaluate an
-/// address, and count the requests sent.
+/// memory, register, thread and value tests: launch to a breakpoint, continue,
+/// evaluate an address, and count the requests sent.
 
 #include "midebug.h"
 #include "process/gdbprocess.h"
@@ -28,9 +28,9 @@ public:
   /// Loads Program under Debugger, breaks at each of Locations and runs to
   /// the first stop.
   void Launch(const std::string& Program, TGDBLanguage Language, const std::vector<std::string>& Locations,
-              const std::string& Debugger = "gdb") {
-    Process = TGDBProcessManager::CreateProcess(Listener, Program, "", "", "local", "Linux64", Language, gcAMD64,
-                                                Debugger);
+              const std::string& Debugger = "gdb", const std::string& Arguments = "") {
+    Process = TGDBProcessManager::CreateProcess(Listener, Program, Arguments, "", "local", "Linux64", Language,
+                                                gcAMD64, Debugger);
     ASSERT_TRUE(Process);
     for (const std::string& Location : Locations)
       ASSERT_TRUE(Core().ProcessAsyncRequest("-break-insert " + Location));
@@ -45,10 +45,10 @@ public:
 
   void WaitForStop() {
     const size_t Before = FStops;
-    ASSERT_TRUE(Listener->PumpUntil([&] { return Listener->CountOf("Suspended(") > Before; }))
-        << "the program did not stop";
-    FStops = Listener->CountOf("Suspended(");
+    ASSERT_TRUE(Listener->PumpUntil([&] { return Stops() > Before; })) << "the program did not stop";
+    FStops = Stops();
   }
+  size_t Stops() const { return Listener->CountOf("Suspended("); }
 
   /// The address an expression evaluates to ("&pattern", "buffer").
   UInt64 AddressOf(const std::string& Expression) {
@@ -76,6 +76,11 @@ public:
   }
 
   TGDBProcess& Core() { return *static_cast<TGDBProcess*>(Process.get()); }
+
+  /// Finds LLDB's MI front end; false, with the reason to skip in WhyNot,
+  /// where it does not run here.
+  bool FindLLDB() { return !(LLDB = LLDBMIPath(WhyNot)).empty(); }
+  std::string LLDB, WhyNot;
 
   TIntfPtr<TTestListener> Listener{new TTestListener};
   TIntfPtr<IGDBProcess> Process;

@@ -1,11 +1,14 @@
 #include "testsupport.h"
 
+#include <gtest/gtest.h>
+
 #include <cstdio>
 #include <cstdlib>
 #include <filesystem>
 #include <fstream>
 #include <sstream>
 #include <stdexcept>
+#include <sys/wait.h>
 #include <unistd.h>
 
 namespace midebug::test {
@@ -27,6 +30,25 @@ std::string LLDBMIPath(std::string& WhyNot) {
 
 std::string DebuggeeSource(const std::string& FileName) {
   return std::string(MIDEBUG_DEBUGGEE_SOURCES) + "/" + FileName;
+}
+
+Integer LineOf(const std::string& FileName, const std::string& Marker) {
+  std::ifstream Source(DebuggeeSource(FileName));
+  std::string Line;
+  for (Integer Number = 1; std::getline(Source, Line); ++Number)
+    if (Line.find(Marker) != std::string::npos)
+      return Number;
+  return 0;
+}
+
+int StartDebuggee(const std::string& Name) {
+  FILE* Shell = popen(("exec " + Quote(Debuggee(Name)) + " >/dev/null 2>&1 & echo $!").c_str(), "r");
+  int Pid = 0;
+  if (Shell && std::fscanf(Shell, "%d", &Pid) != 1)
+    Pid = 0;
+  if (Shell)
+    pclose(Shell);
+  return Pid;
 }
 
 std::string FakeScript(const std::string& Name) { return TestDataDir() + "/fakemi/" + Name; }
@@ -130,6 +152,84 @@ TScopedEnv::~TScopedEnv() {
     setenv(FName.c_str(), FOldValue.c_str(), 1);
   else
     unsetenv(FName.c_str());
+}
+
+const nlohmann::json* TCliRun::Find(const std::function<bool(const nlohmann::json&)>& Match) const {
+  for (const nlohmann::json& Line : Lines)
+    if (Match(Line))
+      return &Line;
+  return nullptr;
+}
+
+const nlohmann::json* TCliRun::Answer(const std::string& Name) const {
+  return Find([&](const nlohmann::json& Line) { return Line.value("answer", "") == Name; });
+}
+
+const nlohmann::json* TCliRun::Event(const std::string& Name) const {
+  return Find([&](const nlohmann::json& Line) { return Line.value("event", "") == Name; });
+}
+
+std::vector<nlohmann::json> TCliRun::All(const std::string& Key, const std::string& Value) const {
+  std::vector<nlohmann::json> Found;
+  for (const nlohmann::json& Line : Lines)
+    if (Line.value(Key, "") == Value)
+      Found.push_back(Line);
+  return Found;
+}
+
+std::string TCliRun::Output() const {
+  std::string Text;
+  for (const nlohmann::json& Line : All("event", "output"))
+    if (Line.value("kind", "") == "output")
+      Text += Line.value("text", "");
+  return Text;
+}
+
+std::string Quote(const std::string& Text) { return "'" + Text + "'"; }
+
+UInt64 SymbolAddress(const std::string& Program, const std::string& Symbol) {
+  constexpr UInt64 LoadBase = 0x555555554000;
+  FILE* Listing = popen(("nm " + Quote(Program)).c_str(), "r");
+  if (!Listing)
+    return 0;
+  char Line[512];
+  UInt64 Address = 0;
+  while (std::fgets(Line, sizeof Line, Listing)) {
+    std::istringstream Fields(Line);
+    std::string Offset, Kind, Name;
+    if (Fields >> Offset >> Kind >> Name && Name == Symbol)
+      Address = LoadBase + std::stoull(Offset, nullptr, 16);
+  }
+  pclose(Listing);
+  return Address;
+}
+
+std::string Hex(UInt64 Address) {
+  char Text[24];
+  std::snprintf(Text, sizeof Text, "0x%016llx", static_cast<unsigned long long>(Address));
+  return Text;
+}
+
+TCliRun RunCli(const TScratchDir& Dir, const std::string& Arguments, const std::string& Commands, bool Json) {
+  const std::string Input = Dir.WriteFile("commands.txt", Commands);
+  const std::string Output = Dir.Path() + "/stdout.txt";
+  const std::string Errors = Dir.Path() + "/stderr.txt";
+  const std::string Command = "cd " + Quote(Dir.Path()) + " && " + Quote(MIDEBUG_CLI) + " --batch " +
+                              (Json ? "--json " : "") + "--wait 20 " + Arguments + " < " + Quote(Input) + " > " +
+                              Quote(Output) + " 2> " + Quote(Errors);
+  TCliRun Run;
+  const int Status = std::system(Command.c_str());
+  Run.ExitCode = WIFEXITED(Status) ? WEXITSTATUS(Status) : -1;
+  Run.Stdout = ReadWholeFile(Output);
+  Run.Stderr = ReadWholeFile(Errors);
+  std::istringstream Lines(Run.Stdout);
+  for (std::string Line; Json && std::getline(Lines, Line);) {
+    nlohmann::json Object = nlohmann::json::parse(Line, nullptr, false);
+    EXPECT_FALSE(Object.is_discarded()) << "not JSON: " << Line;
+    if (!Object.is_discarded())
+      Run.Lines.push_back(std::move(Object));
+  }
+  return Run;
 }
 
 } // namespace midebug::test

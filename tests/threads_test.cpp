@@ -4,10 +4,7 @@
 
 #include "inspect/gdbthread.h"
 #include "inspect/gdbthreadtable.h"
-#include "midebug.h"
-#include "process/gdbprocess.h"
-#include "testlistener.h"
-#include "testsupport.h"
+#include "stoppedprogram.h"
 
 #include <gtest/gtest.h>
 
@@ -49,44 +46,9 @@ bool Glob(std::string_view Text, std::string_view Pattern) {
 
 UInt64 HeaderAddress(const std::string& Header) { return std::stoull(Header.substr(1, 16), nullptr, 16); }
 
-class ThreadsTest : public ::testing::Test {
+class ThreadsTest : public test::StoppedProgram {
 protected:
-  void SetUp() override { SetMainThread(); }
-
-  /// Loads Program under GDB, puts a breakpoint on each of Functions and runs
-  /// it to the first stop.
-  void Launch(const std::string& Program, TGDBLanguage Language, const std::vector<std::string>& Functions,
-              const std::string& Arguments = "") {
-    Process = TGDBProcessManager::CreateProcess(Listener, Program, Arguments, "", "local", "Linux64", Language,
-                                                gcAMD64, "gdb");
-    ASSERT_TRUE(Process);
-    for (const std::string& Function : Functions)
-      ASSERT_TRUE(Core().ProcessAsyncRequest("-break-insert " + Function));
-    ASSERT_TRUE(Core().ProcessAsyncRequest("-exec-run"));
-    WaitForStop();
-  }
-
-  void Continue() {
-    ASSERT_TRUE(Core().ProcessAsyncRequest("-exec-continue"));
-    WaitForStop();
-  }
-
-  void WaitForStop() {
-    const size_t Before = FStops;
-    ASSERT_TRUE(Listener->PumpUntil([&] { return Stops() > Before; })) << "the program did not stop";
-    FStops = Stops();
-  }
-
-  size_t Stops() const { return Listener->CountOf("Suspended("); }
-
-  TGDBProcess& Core() { return *static_cast<TGDBProcess*>(Process.get()); }
   static TGDBThread& Of(const TIntfPtr<IGDBThread>& Thread) { return *static_cast<TGDBThread*>(Thread.get()); }
-
-  TIntfPtr<TTestListener> Listener{new TTestListener};
-  TIntfPtr<IGDBProcess> Process;
-
-private:
-  size_t FStops = 0;
 };
 
 // tests/debuggees/threaded.c: the worker stops in inner, called from
@@ -274,7 +236,7 @@ TEST_F(ThreadsTest, DeepStacksCountEveryFrameDownToMain) {
 
 TEST_F(ThreadsTest, AStackDeeperThanCountedEndsInAnEntryThatIsNoFrame) {
   constexpr Integer Counted = TGDBThreadTable::MaxCallDepth;
-  ASSERT_NO_FATAL_FAILURE(Launch(test::Debuggee("deep"), glC, {"bottom"}, std::to_string(Counted)));
+  ASSERT_NO_FATAL_FAILURE(Launch(test::Debuggee("deep"), glC, {"bottom"}, "gdb", std::to_string(Counted)));
   const TIntfPtr<IGDBThread> Thread = Process->GetThread(1);
   ASSERT_EQ(Thread->GetCallCount(), Counted + 1);
   EXPECT_TRUE(IsCHeader(Thread->GetCallHeader(Counted), "recurse(left=" + std::to_string(Counted - 2) + ")"));

@@ -6,67 +6,25 @@
 
 #include "inspect/gdbthread.h"
 #include "inspect/gdbthreadtable.h"
-#include "midebug.h"
-#include "process/gdbprocess.h"
-#include "testlistener.h"
-#include "testsupport.h"
+#include "stoppedprogram.h"
 
-#include <gtest/gtest.h>
-
-#include <fstream>
 #include <string>
 #include <vector>
 
 namespace midebug::test {
 
-/// The 1-based line of the debuggee source FileName that contains Marker; 0
-/// when none does.
-inline Integer LineOf(const std::string& FileName, const std::string& Marker) {
-  std::ifstream Source(DebuggeeSource(FileName));
-  std::string Line;
-  for (Integer Number = 1; std::getline(Source, Line); ++Number)
-    if (Line.find(Marker) != std::string::npos)
-      return Number;
-  return 0;
-}
-
-class ValueSession : public ::testing::Test {
+class ValueSession : public StoppedProgram {
 protected:
-  void SetUp() override { SetMainThread(); }
-
-  /// Loads Program, breaks at each of Locations ("file:line" or a function)
-  /// and runs to the first stop.
-  void Launch(const std::string& Program, TGDBLanguage Language, const std::vector<std::string>& Locations) {
-    Process = TGDBProcessManager::CreateProcess(Listener, Program, "", "", "local", "Linux64", Language, gcAMD64,
-                                                "gdb");
-    ASSERT_TRUE(Process);
-    for (const std::string& Location : Locations)
-      ASSERT_TRUE(Core().ProcessAsyncRequest("-break-insert " + Location));
-    ASSERT_TRUE(Core().ProcessAsyncRequest("-exec-run"));
-    WaitForStop();
-  }
   /// "FILE:LINE" of the line of FileName holding Marker.
   static std::string At(const std::string& FileName, const std::string& Marker) {
     return FileName + ":" + std::to_string(LineOf(FileName, Marker));
   }
 
-  void Continue() {
-    ASSERT_TRUE(Core().ProcessAsyncRequest("-exec-continue"));
-    WaitForStop();
-  }
   void StepOver() {
     Thread()->StepOver();
     WaitForStop();
   }
-  void WaitForStop() {
-    const size_t Before = FStops;
-    ASSERT_TRUE(Listener->PumpUntil([&] { return Stops() > Before; })) << "the program did not stop";
-    FStops = Stops();
-  }
-  size_t Stops() const { return Listener->CountOf("Suspended("); }
-
   TIntfPtr<IGDBThread> Thread() { return Process->GetThread(Process->GetSuspendedThreadId()); }
-  TGDBProcess& Core() { return *static_cast<TGDBProcess*>(Process.get()); }
 
   /// The value Evaluate gives, or "error: " and the message.
   std::string Eval(const std::string& Expr, const std::string& Suffix = "", Integer Frame = 1) {
@@ -91,12 +49,6 @@ protected:
       All.push_back(Member(Inspector, Index));
     return All;
   }
-
-  TIntfPtr<TTestListener> Listener{new TTestListener};
-  TIntfPtr<IGDBProcess> Process;
-
-private:
-  size_t FStops = 0;
 };
 
 } // namespace midebug::test
