@@ -42,8 +42,9 @@ void TDapListener::SignalReceived(bool& ShouldStop, Integer ThreadId, const TGDB
     FSession->OnSignal(ThreadId, SignalException);
 }
 void TDapListener::ExceptionRaised(bool& ShouldStop, Integer ThreadId, const TGDBException& LanguageException) {
-  ShouldStop = true;
-  if (FSession)
+  // Only the kinds the client's filters name stop the program.
+  ShouldStop = FSession && FSession->CatchesException(LanguageException);
+  if (ShouldStop)
     FSession->OnException(ThreadId, LanguageException);
 }
 void TDapListener::LogEvent(const TGDBLogEvent& Event) {
@@ -132,6 +133,8 @@ void TDapSession::OnSuspended(Integer ThreadId) {
   } else {
     TIntfPtr<IGDBThread> Thread = FProcess ? FProcess->GetThread(ThreadId) : nullptr;
     Body["reason"] = StopReasonWord(Thread ? Thread->GetStopReason() : tsrUnknown);
+    if (Body["reason"] == "breakpoint" && !FHitBreakpoints.empty())
+      Body["hitBreakpointIds"] = FHitBreakpoints;
   }
   FEntryPending = false;
   FPausePending = false;
@@ -144,6 +147,8 @@ void TDapSession::OnResumed(Integer ThreadId) {
     return;
   FState = TProgramState::Running;
   FFrames.clear();
+  FVariables.clear();
+  FHitBreakpoints.clear();
   SendEvent("continued", {{"threadId", ThreadId}, {"allThreadsContinued", true}});
 }
 
@@ -186,7 +191,8 @@ void TDapSession::OnSignal(Integer /*ThreadId*/, const TGDBException& Signal) {
                                                 {"text", Signal.Name}});
 }
 
-void TDapSession::OnException(Integer /*ThreadId*/, const TGDBException& Exception) {
+void TDapSession::OnException(Integer ThreadId, const TGDBException& Exception) {
+  FExceptions[ThreadId] = Exception;
   std::string Description = Exception.Name;
   if (!Exception.Desc.empty())
     Description += (Description.empty() ? "" : ": ") + Exception.Desc;
