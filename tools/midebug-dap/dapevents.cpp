@@ -2,6 +2,11 @@
 
 #include "dapsession.h"
 
+#include <cxxabi.h>
+
+#include <cstdlib>
+#include <memory>
+
 namespace midebug::dap {
 
 // --- The listener --------------------------------------------------------------
@@ -95,6 +100,14 @@ const char* StopReasonWord(TThreadStopReason Reason) {
   default:
     return "pause";
   }
+}
+
+/// The C++ type a mangled name stands for; the name itself otherwise.
+std::string Demangled(const std::string& Name) {
+  int Status = 0;
+  std::unique_ptr<char, decltype(&std::free)> Readable(abi::__cxa_demangle(Name.c_str(), nullptr, nullptr, &Status),
+                                                       &std::free);
+  return Status == 0 && Readable ? std::string(Readable.get()) : Name;
 }
 
 /// "NAME (what it means)", or the part that is known.
@@ -191,7 +204,23 @@ void TDapSession::OnSignal(Integer /*ThreadId*/, const TGDBException& Signal) {
                                                 {"text", Signal.Name}});
 }
 
-void TDapSession::OnException(Integer ThreadId, const TGDBException& Exception) {
+void TDapSession::OnException(Integer ThreadId, const TGDBException& Raised) {
+  TGDBException Exception = Raised;
+  Exception.Name = Demangled(Raised.Name);
+  // The library names a C++ exception's type only; the standard ones say
+  // what went wrong when asked: what() is the third entry of their virtual
+  // table. Written in C, the language the debugger speaks inside the
+  // runtime that throws.
+  if (Exception.Desc.empty() && Exception.EObject != 0 && Exception.Name.starts_with("std::") && FProcess)
+    if (TIntfPtr<IGDBThread> Thread = FProcess->GetThread(ThreadId)) {
+      std::string Value, TypeName;
+      bool CanModify = false;
+      const std::string Object = "(void*)" + std::to_string(Exception.EObject);
+      const std::string Expr = "((const char*(*)(void*))(*(void***)" + Object + ")[2])(" + Object + ")";
+      if (Thread->Evaluate(Expr, "", 1, Value, CanModify, TypeName) == ercOk)
+        if (const size_t Quote = Value.find('"'); Quote != std::string::npos && Value.back() == '"')
+          Exception.Desc = Value.substr(Quote + 1, Value.size() - Quote - 2);
+    }
   FExceptions[ThreadId] = Exception;
   std::string Description = Exception.Name;
   if (!Exception.Desc.empty())
