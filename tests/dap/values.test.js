@@ -27,7 +27,9 @@ test('scopes, variables, evaluate and assignments of a C frame; a 100,000-elemen
     assert.equal(frame.line, stopLine);
 
     const scopes = (await client.scopesRequest({ frameId: frame.id })).body.scopes;
-    assert.deepEqual(scopes.map((x) => x.name), ['Locals', 'Arguments']);
+    assert.deepEqual(scopes.map((x) => x.name), ['Locals', 'Arguments', 'Registers']);
+    const registers = await variables(client, scopes[2].variablesReference);
+    assert.ok(registers.length >= 16 && registers.every((r) => /^0x[0-9a-f]+$/.test(r.value)), JSON.stringify(registers));
     const args = await variables(client, scopes[1].variablesReference);
     assert.deepEqual(args.map((v) => v.name), ['number', 'scale', 'mark', 'where']);
     assert.equal(args[0].value, '3');

@@ -202,6 +202,8 @@ private:
     Integer Total = 0;
     /// A scope: a slice of the locals view, listed whole.
     bool Scope = false;
+    /// The thread's general registers.
+    bool Registers = false;
     /// Each member listed so far, by name: its full expression.
     std::map<std::string, std::string> Expressions;
   };

@@ -133,9 +133,20 @@ TDapReply TDapSession::Scopes(TDapArguments& Arguments) {
                           {"expensive", false},
                           {"variablesReference", VariablesHandle(std::move(Ref))}};
   };
+  TVariablesRef Registers;
+  Registers.Thread = Thread;
+  Registers.Frame = Frame;
+  Registers.Registers = true;
+  Registers.Total = static_cast<Integer>(GeneralRegisterTable(Thread->GetCPUType(), "Linux64").Registers.size());
+  const Integer RegisterCount = Registers.Total;
   return TDapReply::Ok({{"scopes",
                          {Scope("Locals", "locals", Arguments0, Count),
-                          Scope("Arguments", "arguments", 0, Arguments0)}}});
+                          Scope("Arguments", "arguments", 0, Arguments0),
+                          {{"name", "Registers"},
+                           {"presentationHint", "registers"},
+                           {"namedVariables", RegisterCount},
+                           {"expensive", true},
+                           {"variablesReference", VariablesHandle(std::move(Registers))}}}}});
 }
 
 TDapReply TDapSession::Variables(TDapArguments& Arguments) {
@@ -156,7 +167,23 @@ TDapReply TDapSession::Variables(TDapArguments& Arguments) {
       static_cast<Integer>(std::min<long long>(Count && *Count > 0 ? *Count : Ref.Total, Ref.Total - First));
   nlohmann::json List = nlohmann::json::array();
   std::map<std::string, std::string> Expressions;
-  if (Wanted > 0) {
+  if (Wanted > 0 && Ref.Registers) {
+    // The innermost frame's registers: the thread's own.
+    const TRegisterTable Table = GeneralRegisterTable(Ref.Thread->GetCPUType(), "Linux64");
+    TUInt64Array Values;
+    UInt64 PC = 0;
+    if (!Ref.Thread->GetRegisters(Values, PC))
+      return TDapReply::Refuse("the registers cannot be read");
+    for (Integer Index = First; Index < First + Wanted && static_cast<size_t>(Index) < Values.size() &&
+                                static_cast<size_t>(Index) < Table.Registers.size();
+         ++Index) {
+      const std::string Name(Table.Registers[static_cast<size_t>(Index)]);
+      std::ostringstream Value;
+      Value << "0x" << std::hex << Values[static_cast<size_t>(Index)];
+      List.push_back({{"name", Name}, {"value", Value.str()}, {"evaluateName", "$" + Name}, {"variablesReference", 0}});
+      Expressions[Name] = "$" + Name;
+    }
+  } else if (Wanted > 0) {
     // The locals view is listed whole; other values through a window.
     Integer Base = Ref.From + First;
     const bool Locals = Ref.Scope;
