@@ -35,7 +35,7 @@ constexpr int ArraySize = 5000;
 constexpr int PageSize = 100;
 
 /// 20 calls deep, a long loop to step through, and an array to read.
-constexpr const char* SteppedProgram = R"(int numbers[5000];
+constexpr const char* SteppedProgram = R"(int numbers[5000] = {1, 2, 3};
 static void spin(void) {
   volatile long total = 0;
   for (long i = 0; i < 100000000; ++i) {
@@ -50,8 +50,6 @@ static void descend(int left) {
   descend(left - 1);
 }
 int main(void) {
-  for (int i = 0; i < 5000; ++i)
-    numbers[i] = i;
   descend(18);
   return 0;
 }
