@@ -42,7 +42,7 @@ test('hit conditions and a condition count a loop; a log point prints and runs o
       breakpoints: [
         { line: add, hitCondition: '%4' },
         // Only odd rounds count; from the 4th of them (round 7) on.
-        { line: call, condition: 'round % 2 == 1', hitCondition: '>=4' },
+        { line: call, condition: 'round % 2 == 1', hitCondition: ' >= 4 ' },
         { line: write, logMessage: 'counter is {counter}, {nosuch}' },
         { line: add, hitCondition: 'often' },
       ],

@@ -7,7 +7,7 @@
 
 #include "dapsession.h"
 
-#include <chrono>
+#include <algorithm>
 #include <filesystem>
 
 namespace midebug::dap {
@@ -49,6 +49,7 @@ bool ParseHitCondition(const std::string& Text, char& Operator, long long& Count
     Operator = Text[Start];
     Start += 1;
   }
+  Start = std::min(Text.find_first_not_of(' ', Start), Text.size());
   const size_t End = Text.find_last_not_of(' ') + 1;
   const std::string Digits = Text.substr(Start, End > Start ? End - Start : 0);
   if (Digits.empty() || Digits.size() > 12 || Digits.find_first_not_of("0123456789") != std::string::npos)

@@ -102,6 +102,17 @@ const char* StopReasonWord(TThreadStopReason Reason) {
   }
 }
 
+/// A type of the standard library's exception family, which all have
+/// what(); others (a thrown std::string, say) have no virtual table to call.
+bool IsStandardException(const std::string& Type) {
+  if (!Type.starts_with("std::"))
+    return false;
+  for (const char* Word : {"error", "exception", "::bad_", "failure"})
+    if (Type.find(Word) != std::string::npos)
+      return true;
+  return false;
+}
+
 /// The C++ type a mangled name stands for; the name itself otherwise.
 std::string Demangled(const std::string& Name) {
   int Status = 0;
@@ -211,7 +222,7 @@ void TDapSession::OnException(Integer ThreadId, const TGDBException& Raised) {
   // what went wrong when asked: what() is the third entry of their virtual
   // table. Written in C, the language the debugger speaks inside the
   // runtime that throws.
-  if (Exception.Desc.empty() && Exception.EObject != 0 && Exception.Name.starts_with("std::") && FProcess)
+  if (Exception.Desc.empty() && Exception.EObject != 0 && IsStandardException(Exception.Name) && FProcess)
     if (TIntfPtr<IGDBThread> Thread = FProcess->GetThread(ThreadId)) {
       std::string Value, TypeName;
       bool CanModify = false;
