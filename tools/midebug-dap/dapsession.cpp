@@ -572,6 +572,8 @@ void TDapSession::End(std::optional<bool> TerminateDebuggee) {
     } catch (const std::exception& Error) {
       Output("console", std::string("midebug-dap: ") + Error.what() + "\n");
     }
+    // The inspectors go before the process they ask.
+    FVariables.clear();
     // Releasing the process stops the debugger (and a program loaded but
     // never started).
     FProcess = nullptr;
