@@ -132,3 +132,25 @@ test('a Pascal raise stops with the class and message', async () => {
     await client.stop();
   }
 });
+
+test('a breakpoint in a library not loaded yet is pending, then verified by an event and hit', async () => {
+  const client = await s.startClient();
+  try {
+    const verified = new Promise((resolve) => client.on('breakpoint', (event) => event.body.breakpoint.verified && resolve(event.body.breakpoint)));
+    const initialized = client.waitForEvent('initialized');
+    await client.initializeRequest({ adapterID: 'midebug' });
+    await initialized;
+    await client.launchRequest({ program: s.debuggee('pluginhost') });
+    const set = await client.setBreakpointsRequest({ source: { path: s.source('plug.c') }, breakpoints: [{ line: 1 }] });
+    assert.equal(set.body.breakpoints[0].verified, false);
+    const stopped = client.waitForEvent('stopped');
+    await client.configurationDoneRequest();
+    const placed = await verified;
+    assert.equal(placed.id, set.body.breakpoints[0].id);
+    assert.equal(placed.line, 1);
+    const stop = (await stopped).body;
+    assert.deepEqual([stop.reason, stop.hitBreakpointIds], ['breakpoint', [placed.id]]);
+  } finally {
+    await client.stop();
+  }
+});
