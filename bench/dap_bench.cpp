@@ -1,8 +1,9 @@
 // The debug adapter against GDB driven straight over pipes, interleaved on
 // the same program: (a) from starting the adapter (or GDB) to the first stop
 // at main; (b) 200 times a step over a line, its stop and a stack trace of
-// 20 frames. Each is measured in 5 rounds; the medians and their ratios are
-// printed.
+// 20 frames; (c) a 5,000-element array evaluated and read through
+// `variables` in pages of 100. Each is measured in 5 rounds; the medians and
+// their ratios are printed.
 
 #include "benchsupport.h"
 #include "dapframing.h"
@@ -30,9 +31,12 @@ using TMilliseconds = std::chrono::duration<double, std::milli>;
 constexpr int Rounds = 5;
 constexpr int StepsPerRound = 200;
 constexpr int TraceLevels = 20;
+constexpr int ArraySize = 5000;
+constexpr int PageSize = 100;
 
-/// 20 calls deep, a long loop to step through.
-constexpr const char* SteppedProgram = R"(static void spin(void) {
+/// 20 calls deep, a long loop to step through, and an array to read.
+constexpr const char* SteppedProgram = R"(int numbers[5000] = {1, 2, 3};
+static void spin(void) {
   volatile long total = 0;
   for (long i = 0; i < 100000000; ++i) {
     total += i;
@@ -225,15 +229,66 @@ int Run() {
     AdapterSteps.push_back(TMilliseconds(AdapterTime).count());
     RawSteps.push_back(TMilliseconds(RawTime).count());
   }
+
+  // (c) The array, evaluated then read page by page, both sessions stopped
+  // in the loop.
+  std::vector<double> AdapterPages, RawPages;
+  int RawVar = 0;
+  for (int Round = 0; Round < Rounds; ++Round) {
+    TClock::time_point Begin = TClock::now();
+    const nlohmann::json Value =
+        Client.Response(Client.Send("evaluate", {{"expression", "numbers"}, {"context", "watch"}}));
+    const int Reference = Value["body"].value("variablesReference", 0);
+    for (int Start = 0; Start < ArraySize; Start += PageSize) {
+      const nlohmann::json Page = Client.Response(
+          Client.Send("variables", {{"variablesReference", Reference}, {"start", Start}, {"count", PageSize}}));
+      if (Page.is_null() || Page["body"]["variables"].size() != PageSize) {
+        std::fprintf(stderr, "dap_bench: a page of the array came short\n");
+        return 1;
+      }
+    }
+    AdapterPages.push_back(TMilliseconds(TClock::now() - Begin).count());
+    Begin = TClock::now();
+    // The same MI the adapter's evaluation and pages cost, as the
+    // debugger's log shows: a value, an inspector, then per page a slice
+    // and each element's value, attributes and path.
+    const std::string Value1 = "raw" + std::to_string(++RawVar), Value2 = "raw" + std::to_string(++RawVar);
+    bool Done = Raw.Request("-var-create " + Value1 + " * \"numbers\"") &&
+                Raw.Request("-var-show-attributes \"" + Value1 + "\"") &&
+                Raw.Request("-var-create " + Value2 + " * \"numbers\"") &&
+                Raw.Request("-var-show-attributes \"" + Value2 + "\"") &&
+                Raw.Request("-var-info-path-expression \"" + Value2 + "\"");
+    for (int Start = 0; Done && Start < ArraySize; Start += PageSize) {
+      const std::string Slice = "raw" + std::to_string(++RawVar);
+      Done = Raw.Request("-var-create " + Slice + " * \"(numbers)[" + std::to_string(Start) + "]@" +
+                         std::to_string(PageSize) + "\"") &&
+             Raw.Request("-var-show-attributes \"" + Slice + "\"") &&
+             Raw.Request("-var-list-children \"" + Slice + "\"");
+      for (int Index = 0; Done && Index < PageSize; ++Index) {
+        const std::string Child = "\"" + Slice + "." + std::to_string(Index) + "\"";
+        Done = Raw.Request("-var-evaluate-expression " + Child) && Raw.Request("-var-show-attributes " + Child) &&
+               Raw.Request("-var-info-path-expression " + Child);
+      }
+    }
+    if (!Done) {
+      std::fprintf(stderr, "dap_bench: GDB did not read the array\n");
+      return 1;
+    }
+    RawPages.push_back(TMilliseconds(TClock::now() - Begin).count());
+  }
   Client.Response(Client.Send("disconnect"));
 
   const double A = Median(AdapterStart), AR = Median(RawStart);
   const double B = Median(AdapterSteps), BR = Median(RawSteps);
+  const double C = Median(AdapterPages), CR = Median(RawPages);
   std::printf("(a) launch to the stop at main: adapter %.1f ms, GDB over pipes %.1f ms (median of %d)\n", A, AR, Rounds);
   std::printf("(b) %d x (next, stopped, stackTrace of %d frames): adapter %.1f ms, GDB over pipes %.1f ms "
               "(median of %d)\n", StepsPerRound, TraceLevels, B, BR, Rounds);
   std::printf("ratio (a) adapter / GDB = %.3f\n", A / AR);
+  std::printf("(c) evaluate and %d pages of %d array elements: adapter %.1f ms, GDB over pipes %.1f ms (median of %d)\n",
+              ArraySize / PageSize, PageSize, C, CR, Rounds);
   std::printf("ratio (b) adapter / GDB = %.3f\n", B / BR);
+  std::printf("ratio (c) adapter / GDB = %.3f\n", C / CR);
   return 0;
 }
 

@@ -56,16 +56,28 @@ test('initialize advertises what is served, and the rest is refused in words', a
   try {
     const capabilities = (await client.initializeRequest({ adapterID: 'midebug' })).body;
     for (const served of ['supportsConfigurationDoneRequest', 'supportsTerminateRequest', 'supportsCancelRequest',
-                          'supportsSteppingGranularity', 'supportsDelayedStackTraceLoading', 'supportTerminateDebuggee'])
+                          'supportsSteppingGranularity', 'supportsDelayedStackTraceLoading', 'supportTerminateDebuggee',
+                          'supportsFunctionBreakpoints', 'supportsConditionalBreakpoints', 'supportsSetVariable',
+                          'supportsEvaluateForHovers', 'supportsHitConditionalBreakpoints', 'supportsLogPoints'])
       assert.equal(capabilities[served], true, served);
-    for (const missing of ['supportsFunctionBreakpoints', 'supportsConditionalBreakpoints', 'supportsSetVariable',
-                           'supportsEvaluateForHovers', 'supportsHitConditionalBreakpoints', 'supportsLogPoints'])
+    for (const missing of ['supportsDataBreakpoints', 'supportsReadMemoryRequest', 'supportsRestartRequest'])
       assert.notEqual(capabilities[missing], true, missing);
     await assert.rejects(client.initializeRequest({ adapterID: 'midebug' }), /already/);
 
-    for (const waiting of ['setBreakpoints', 'setFunctionBreakpoints', 'setExceptionBreakpoints', 'breakpointLocations',
-                           'scopes', 'variables', 'evaluate', 'setVariable', 'setExpression'])
-      await assert.rejects(client.customRequest(waiting, {}), /does not serve this request yet/, waiting);
+    // Without their arguments, or with no program, each is refused in words.
+    for (const [request, problem] of [['setBreakpoints', /needs 'source'/], ['setFunctionBreakpoints', /needs a list/],
+      ['breakpointLocations', /needs 'source'/], ['scopes', /'frameId' is missing/], ['variables', /'variablesReference'/],
+      ['evaluate', /needs an 'expression'/], ['setVariable', /needs 'variablesReference'/],
+      ['setExpression', /needs 'expression'/], ['exceptionInfo', /'threadId'/]])
+      await assert.rejects(client.customRequest(request, {}), problem, request);
+    await assert.rejects(client.customRequest('setBreakpoints', { source: { path: 'a.c' }, breakpoints: 3 }), /a list/);
+    await assert.rejects(client.customRequest('setExceptionBreakpoints', { filters: [1] }), /list of strings/);
+    await assert.rejects(client.evaluateRequest({ expression: '1' }), /no program/);
+    // Kept for the program to come; one that is no object is refused alone.
+    const kept = await client.setBreakpointsRequest({ source: { path: 'a.c' }, breakpoints: [{ line: 3 }, 'x', { line: -2 }] });
+    assert.deepEqual(kept.body.breakpoints.map((b) => b.verified), [false, false, false]);
+    assert.match(kept.body.breakpoints[1].message, /must be an object/);
+    assert.match(kept.body.breakpoints[2].message, /'line'/);
     await assert.rejects(client.customRequest('frobnicate'), /does not know the request 'frobnicate'/);
     await client.cancelRequest?.({ requestId: 1 }) ?? client.customRequest('cancel', { requestId: 1 });
 

@@ -2,6 +2,11 @@
 
 #include "dapsession.h"
 
+#include <cxxabi.h>
+
+#include <cstdlib>
+#include <memory>
+
 namespace midebug::dap {
 
 // --- The listener --------------------------------------------------------------
@@ -42,8 +47,9 @@ void TDapListener::SignalReceived(bool& ShouldStop, Integer ThreadId, const TGDB
     FSession->OnSignal(ThreadId, SignalException);
 }
 void TDapListener::ExceptionRaised(bool& ShouldStop, Integer ThreadId, const TGDBException& LanguageException) {
-  ShouldStop = true;
-  if (FSession)
+  // Only the kinds the client's filters name stop the program.
+  ShouldStop = FSession && FSession->CatchesException(LanguageException);
+  if (ShouldStop)
     FSession->OnException(ThreadId, LanguageException);
 }
 void TDapListener::LogEvent(const TGDBLogEvent& Event) {
@@ -96,6 +102,25 @@ const char* StopReasonWord(TThreadStopReason Reason) {
   }
 }
 
+/// A type of the standard library's exception family, which all have
+/// what(); others (a thrown std::string, say) have no virtual table to call.
+bool IsStandardException(const std::string& Type) {
+  if (!Type.starts_with("std::"))
+    return false;
+  for (const char* Word : {"error", "exception", "::bad_", "failure"})
+    if (Type.find(Word) != std::string::npos)
+      return true;
+  return false;
+}
+
+/// The C++ type a mangled name stands for; the name itself otherwise.
+std::string Demangled(const std::string& Name) {
+  int Status = 0;
+  std::unique_ptr<char, decltype(&std::free)> Readable(abi::__cxa_demangle(Name.c_str(), nullptr, nullptr, &Status),
+                                                       &std::free);
+  return Status == 0 && Readable ? std::string(Readable.get()) : Name;
+}
+
 /// "NAME (what it means)", or the part that is known.
 std::string Described(const std::string& Name, const std::string& Desc) {
   if (Desc.empty())
@@ -132,6 +157,8 @@ void TDapSession::OnSuspended(Integer ThreadId) {
   } else {
     TIntfPtr<IGDBThread> Thread = FProcess ? FProcess->GetThread(ThreadId) : nullptr;
     Body["reason"] = StopReasonWord(Thread ? Thread->GetStopReason() : tsrUnknown);
+    if (Body["reason"] == "breakpoint" && !FHitBreakpoints.empty())
+      Body["hitBreakpointIds"] = FHitBreakpoints;
   }
   FEntryPending = false;
   FPausePending = false;
@@ -144,6 +171,8 @@ void TDapSession::OnResumed(Integer ThreadId) {
     return;
   FState = TProgramState::Running;
   FFrames.clear();
+  FVariables.clear();
+  FHitBreakpoints.clear();
   SendEvent("continued", {{"threadId", ThreadId}, {"allThreadsContinued", true}});
 }
 
@@ -186,7 +215,24 @@ void TDapSession::OnSignal(Integer /*ThreadId*/, const TGDBException& Signal) {
                                                 {"text", Signal.Name}});
 }
 
-void TDapSession::OnException(Integer /*ThreadId*/, const TGDBException& Exception) {
+void TDapSession::OnException(Integer ThreadId, const TGDBException& Raised) {
+  TGDBException Exception = Raised;
+  Exception.Name = Demangled(Raised.Name);
+  // The library names a C++ exception's type only; the standard ones say
+  // what went wrong when asked: what() is the third entry of their virtual
+  // table. Written in C, the language the debugger speaks inside the
+  // runtime that throws.
+  if (Exception.Desc.empty() && Exception.EObject != 0 && IsStandardException(Exception.Name) && FProcess)
+    if (TIntfPtr<IGDBThread> Thread = FProcess->GetThread(ThreadId)) {
+      std::string Value, TypeName;
+      bool CanModify = false;
+      const std::string Object = "(void*)" + std::to_string(Exception.EObject);
+      const std::string Expr = "((const char*(*)(void*))(*(void***)" + Object + ")[2])(" + Object + ")";
+      if (Thread->Evaluate(Expr, "", 1, Value, CanModify, TypeName) == ercOk)
+        if (const size_t Quote = Value.find('"'); Quote != std::string::npos && Value.back() == '"')
+          Exception.Desc = Value.substr(Quote + 1, Value.size() - Quote - 2);
+    }
+  FExceptions[ThreadId] = Exception;
   std::string Description = Exception.Name;
   if (!Exception.Desc.empty())
     Description += (Description.empty() ? "" : ": ") + Exception.Desc;

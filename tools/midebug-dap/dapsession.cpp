@@ -162,17 +162,16 @@ const std::vector<TDapSession::TRequestEntry>& TDapSession::Requests() {
       {"stepOut", &TDapSession::StepOut},
       {"pause", &TDapSession::Pause},
       {"cancel", &TDapSession::Cancel},
-      // Served once the library offers breakpoints, source lines and
-      // evaluation to this adapter.
-      {"setBreakpoints", &TDapSession::NotYetServed},
-      {"setFunctionBreakpoints", &TDapSession::NotYetServed},
-      {"setExceptionBreakpoints", &TDapSession::NotYetServed},
-      {"breakpointLocations", &TDapSession::NotYetServed},
-      {"scopes", &TDapSession::NotYetServed},
-      {"variables", &TDapSession::NotYetServed},
-      {"evaluate", &TDapSession::NotYetServed},
-      {"setVariable", &TDapSession::NotYetServed},
-      {"setExpression", &TDapSession::NotYetServed},
+      {"setBreakpoints", &TDapSession::SetBreakpoints},
+      {"setFunctionBreakpoints", &TDapSession::SetFunctionBreakpoints},
+      {"setExceptionBreakpoints", &TDapSession::SetExceptionBreakpoints},
+      {"breakpointLocations", &TDapSession::BreakpointLocations},
+      {"exceptionInfo", &TDapSession::ExceptionInfo},
+      {"scopes", &TDapSession::Scopes},
+      {"variables", &TDapSession::Variables},
+      {"evaluate", &TDapSession::Evaluate},
+      {"setVariable", &TDapSession::SetVariable},
+      {"setExpression", &TDapSession::SetExpression},
   };
   return Table;
 }
@@ -307,7 +306,7 @@ TDapReply TDapSession::Initialize(TDapArguments& Arguments) {
   FLinesStartAt1 = LinesStartAt1;
   FColumnsStartAt1 = ColumnsStartAt1;
   FClientHasTerminal = ClientHasTerminal;
-  // Exactly what works today; breakpoints, variables and evaluation follow.
+  // Exactly what works.
   return TDapReply::Ok({
       {"supportsConfigurationDoneRequest", true},
       {"supportsTerminateRequest", true},
@@ -315,11 +314,20 @@ TDapReply TDapSession::Initialize(TDapArguments& Arguments) {
       {"supportsCancelRequest", true},
       {"supportsSteppingGranularity", true},
       {"supportsDelayedStackTraceLoading", true},
-      {"supportsFunctionBreakpoints", false},
-      {"supportsConditionalBreakpoints", false},
-      {"supportsEvaluateForHovers", false},
-      {"supportsSetVariable", false},
-      {"exceptionBreakpointFilters", nlohmann::json::array()},
+      {"supportsFunctionBreakpoints", true},
+      {"supportsConditionalBreakpoints", true},
+      {"supportsHitConditionalBreakpoints", true},
+      {"supportsLogPoints", true},
+      {"supportsBreakpointLocationsRequest", true},
+      {"supportsExceptionInfoRequest", true},
+      {"supportsEvaluateForHovers", true},
+      {"supportsSetVariable", true},
+      {"supportsSetExpression", true},
+      {"supportsValueFormattingOptions", true},
+      {"exceptionBreakpointFilters",
+       {{{"filter", "cpp_throw"}, {"label", "C++: on throw"}, {"default", false}},
+        {{"filter", "cpp_catch"}, {"label", "C++: on catch"}, {"default", false}},
+        {{"filter", "pascal_raise"}, {"label", "Pascal: on raise"}, {"default", false}}}},
   });
 }
 
@@ -489,6 +497,8 @@ TDapReply TDapSession::ConfigurationDone(TDapArguments& /*Arguments*/) {
 }
 
 void TDapSession::StartWhenReady() {
+  if (FProcess && !ProgramGone())
+    PlaceBreakpoints();
   if (!FProcess || !FConfigured)
     return;
   if (FAttached || FInTerminal) {
@@ -562,6 +572,8 @@ void TDapSession::End(std::optional<bool> TerminateDebuggee) {
     } catch (const std::exception& Error) {
       Output("console", std::string("midebug-dap: ") + Error.what() + "\n");
     }
+    // The inspectors go before the process they ask.
+    FVariables.clear();
     // Releasing the process stops the debugger (and a program loaded but
     // never started).
     FProcess = nullptr;
@@ -671,10 +683,6 @@ TDapReply TDapSession::Cancel(TDapArguments& /*Arguments*/) {
   // Every request is answered before the next is read: nothing is left to
   // cancel by the time this one is.
   return TDapReply::Ok();
-}
-
-TDapReply TDapSession::NotYetServed(TDapArguments& /*Arguments*/) {
-  return TDapReply::Refuse("midebug-dap does not serve this request yet");
 }
 
 // --- Threads and stacks ----------------------------------------------------------

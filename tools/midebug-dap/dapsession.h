@@ -10,6 +10,8 @@
 #include <nlohmann/json.hpp>
 
 #include <chrono>
+#include <map>
+#include <memory>
 #include <optional>
 #include <set>
 #include <string>
@@ -27,6 +29,8 @@ public:
   explicit TDapListener(TDapSession* Session) : FSession(Session) {}
   /// Called by the session as it ends; events that come later are dropped.
   void Forget() { FSession = nullptr; }
+  /// The session, or null once it has ended.
+  TDapSession* Session() const { return FSession; }
 
   void ProcessSuspended(Integer ThreadId) override;
   void ProcessResumed(Integer ThreadId) override;
@@ -60,6 +64,8 @@ public:
   const nlohmann::json* Object(const char* Name);
   /// A list of strings.
   std::optional<TStringArray> Strings(const char* Name);
+  /// The argument as it is; null when absent.
+  const nlohmann::json* Value(const char* Name) { return Find(Name); }
   /// The first argument that had a wrong type or value; empty when none.
   const std::string& Problem() const { return FProblem; }
 
@@ -117,6 +123,11 @@ public:
   void OnException(Integer ThreadId, const TGDBException& Exception);
   void OnLog(const TGDBLogEvent& Event);
   void OnDebuggerLost();
+  /// A hit of the client's breakpoint Id: true keeps the program stopped.
+  bool OnBreakpointHit(Integer Id, Integer ThreadId);
+  void OnBreakpointVerified(Integer Id, bool Verified, Integer Number, const TGDBLocation& Location);
+  /// True when a filter the client set catches this exception.
+  bool CatchesException(const TGDBException& Exception);
 
 private:
   using THandler = TDapReply (TDapSession::*)(TDapArguments& Arguments);
@@ -140,8 +151,70 @@ private:
   TDapReply StepOut(TDapArguments& Arguments);
   TDapReply Pause(TDapArguments& Arguments);
   TDapReply Cancel(TDapArguments& Arguments);
-  /// The requests whose library operations are still to come.
-  TDapReply NotYetServed(TDapArguments& Arguments);
+  TDapReply SetBreakpoints(TDapArguments& Arguments);
+  TDapReply SetFunctionBreakpoints(TDapArguments& Arguments);
+  TDapReply SetExceptionBreakpoints(TDapArguments& Arguments);
+  TDapReply BreakpointLocations(TDapArguments& Arguments);
+  TDapReply ExceptionInfo(TDapArguments& Arguments);
+  TDapReply Scopes(TDapArguments& Arguments);
+  TDapReply Variables(TDapArguments& Arguments);
+  TDapReply SetVariable(TDapArguments& Arguments);
+  TDapReply SetExpression(TDapArguments& Arguments);
+  TDapReply Evaluate(TDapArguments& Arguments);
+
+  /// One breakpoint of the client's: a source line or a function.
+  struct TBreakpoint {
+    Integer Id = 0;
+    std::string Source;
+    Integer Line = 0;
+    std::string Function;
+    std::string Condition;
+    std::string LogMessage;
+    /// The hit condition: 0 none, '=' on the Nth hit, '>' after the Nth,
+    /// 'g' from the Nth, '%' on every Nth.
+    char HitOperator = 0;
+    long long HitCount = 0;
+    long long Hits = 0;
+    /// The library's number, -1 until placed.
+    Integer Number = -1;
+    bool Placed = false;
+    bool Verified = false;
+    TGDBLocation Location;
+    std::string Message;
+  };
+  /// Reads one breakpoint of a set request; a refusal leaves Message set.
+  std::shared_ptr<TBreakpoint> ReadBreakpoint(const nlohmann::json& Entry, bool Function);
+  void PlaceBreakpoint(TBreakpoint& Breakpoint);
+  /// Places what was set before the program was there.
+  void PlaceBreakpoints();
+  void RemoveBreakpoints(bool Functions, const std::string& Source);
+  nlohmann::json BreakpointJson(const TBreakpoint& Breakpoint) const;
+  /// The text of a log message with each {expression} evaluated.
+  std::string Interpolate(IGDBThread& Thread, const std::string& Message);
+
+  /// What a variables reference stands for: members of an inspector, a
+  /// slice of them (the locals view holds arguments, then locals).
+  struct TVariablesRef {
+    TIntfPtr<IGDBInspect> Inspect;
+    TIntfPtr<IGDBThread> Thread;
+    Integer Frame = 1;
+    Integer From = 0;
+    Integer Total = 0;
+    /// A scope: a slice of the locals view, listed whole.
+    bool Scope = false;
+    /// The thread's general registers.
+    bool Registers = false;
+    /// Each member listed so far, by name: its full expression.
+    std::map<std::string, std::string> Expressions;
+  };
+  Integer VariablesHandle(TVariablesRef Ref);
+  /// The thread and 1-based frame of a frame id; null with Refusal set.
+  TIntfPtr<IGDBThread> FrameThread(TDapArguments& Arguments, Integer& Frame, TDapReply& Refusal, bool Optional);
+  /// A variables reference (and its count) for a value with members.
+  void DescribeChildren(const TIntfPtr<IGDBInspect>& Inspect, const TIntfPtr<IGDBThread>& Thread, Integer Frame,
+                        const std::string& Type, nlohmann::json& Entry);
+  TDapReply Assign(const TIntfPtr<IGDBThread>& Thread, Integer Frame, const std::string& Expr,
+                   const std::string& Value, bool Hex);
 
   /// A response to the adapter's own request.
   void HandleResponse(const nlohmann::json& Response);
@@ -220,6 +293,21 @@ private:
   std::set<Integer> FThreads;
   /// Frame ids handed out since the last stop: thread and 0-based level.
   std::vector<std::pair<Integer, Integer>> FFrames;
+  /// The client's breakpoints by id.
+  std::map<Integer, std::shared_ptr<TBreakpoint>> FBreakpoints;
+  Integer FNextBreakpointId = 0;
+  /// Set while breakpoints are placed for a response that tells their
+  /// verdict: no event then.
+  bool FPlacingForResponse = false;
+  /// The breakpoints that kept the program stopped at its last stop.
+  std::vector<Integer> FHitBreakpoints;
+  /// The exception filters the client set, and the library told.
+  std::set<std::string> FExceptionFilters;
+  bool FExceptionsPlaced = false;
+  /// The last exception that stopped each thread.
+  std::map<Integer, TGDBException> FExceptions;
+  /// Variables references handed out since the last stop.
+  std::vector<TVariablesRef> FVariables;
 };
 
 } // namespace midebug::dap
