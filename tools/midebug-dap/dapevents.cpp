@@ -247,7 +247,7 @@ void TDapSession::OnLog(const TGDBLogEvent& Event) {
     Output("stdout", Event.Data);
     return;
   }
-  // The debugger's own lines come with their line break turned to a blank.
+  // One console line per record, whatever blank or line break ends it.
   std::string Text = Event.Data;
   while (!Text.empty() && (Text.back() == ' ' || Text.back() == '\n'))
     Text.pop_back();
