@@ -43,6 +43,17 @@ TEST_F(CliBreakpoints, BreakpointsStopSayWhichCountHitsAndFollowIgnoreEnableDisa
   EXPECT_EQ(Run.All("event", "exited").at(0)["code"], 1);
 }
 
+TEST_F(CliBreakpoints, AConditionStopsOnlyWhereItHoldsAndOneThatCannotBeTestedStopsSayingWhy) {
+  const std::string Bump = "breakpoints.c:" + std::to_string(Line("breakpoints.c", "bump-add"));
+  const TCliRun Run = RunCli(Scratch, Quote(Debuggee("breakpoints")) + " 5",
+                             "break " + Bump + " if counter == 2\nrun\nprint counter\ncondition 1 nosuch > 1\n"
+                             "continue\ncondition 1\ncontinue\ninfo breakpoints\n");
+  ASSERT_EQ(Run.All("event", "stopped").size(), 3u) << Run.Stdout;
+  EXPECT_EQ(Run.All("answer", "print").at(0)["value"], "2");
+  EXPECT_EQ(Run.All("event", "warning").size(), 1u) << Run.Stdout;
+  EXPECT_EQ(Run.All("answer", "info breakpoints").at(0)["breakpoints"][0]["hits"], 3);
+}
+
 TEST_F(CliBreakpoints, WatchStopsWhereTheWatchedBytesAreWrittenAndSaysWhichWatchpoint) {
   const std::string Address = test::Hex(test::SymbolAddress(Debuggee("breakpoints"), "counter"));
   const TCliRun Run = RunCli(Scratch, Quote(Debuggee("breakpoints")) + " 1",

@@ -26,6 +26,8 @@ struct TCliSession::TCliBreakpoint {
   std::vector<TGDBLocation> Locations;
   Integer Hits = 0;
   Integer IgnoreCount = 0;
+  /// Stops only where this expression holds; empty: always.
+  std::string Condition;
   TPlace Place;
 };
 
@@ -35,8 +37,8 @@ namespace {
 class TCliBreakpointListener : public TInterfaced<IGDBBreakpointListener> {
 public:
   TCliBreakpointListener(TCliSession& Session, Integer Id) : FSession(Session), FId(Id) {}
-  void BreakpointHits(bool& ShouldStop, Integer /*ThreadId*/, TGDBLocation& /*Location*/) override {
-    ShouldStop = FSession.OnBreakpointHit(FId);
+  void BreakpointHits(bool& ShouldStop, Integer ThreadId, TGDBLocation& /*Location*/) override {
+    ShouldStop = FSession.OnBreakpointHit(FId, ThreadId);
   }
   void BreakpointVerified(bool Verified, Integer Breakpoint, const TGDBLocation& Location) override {
     FSession.OnBreakpointVerified(FId, Verified, Breakpoint, Location);
@@ -48,6 +50,14 @@ private:
 };
 
 /// A decimal number, or a hexadecimal one after "0x".
+/// Words From onwards, joined by single blanks.
+std::string JoinWords(const std::vector<std::string>& Words, size_t From) {
+  std::string Joined;
+  for (size_t Index = From; Index < Words.size(); ++Index)
+    Joined += (Joined.empty() ? "" : " ") + Words[Index];
+  return Joined;
+}
+
 bool ParseAddress(const std::string& Text, UInt64& Value) {
   const bool Hex = Text.starts_with("0x") || Text.starts_with("0X");
   const std::string Digits = Hex ? Text.substr(2) : Text;
@@ -116,14 +126,14 @@ void TCliSession::RestoreBreakpoints() {
     FProcess->SetOsException("SIGTRAP", true, false);
 }
 
-bool TCliSession::OnBreakpointHit(Integer Id) {
+bool TCliSession::OnBreakpointHit(Integer Id, Integer ThreadId) {
   const auto Found = FBreakpoints.find(Id);
   if (Found == FBreakpoints.end())
     return false;
   TCliBreakpoint& Breakpoint = *Found->second;
-  ++Breakpoint.Hits;
-  if (!Breakpoint.Enabled)
+  if (!Breakpoint.Enabled || !ConditionHolds(Breakpoint, ThreadId))
     return false;
+  ++Breakpoint.Hits;
   if (Breakpoint.IgnoreCount > 0) {
     --Breakpoint.IgnoreCount;
     return false;
@@ -135,6 +145,28 @@ bool TCliSession::OnBreakpointHit(Integer Id) {
     Breakpoint.Enabled = false;
   }
   return true;
+}
+
+bool TCliSession::ConditionHolds(const TCliBreakpoint& Breakpoint, Integer ThreadId) {
+  if (Breakpoint.Condition.empty())
+    return true;
+  const TIntfPtr<IGDBThread> Thread = FProcess->GetThread(ThreadId);
+  std::string Value, TypeName;
+  bool CanModify = false;
+  if (!Thread || Thread->Evaluate(Breakpoint.Condition, "", 1, Value, CanModify, TypeName) != ercOk) {
+    // A condition that cannot be tested stops the program, so a typo shows.
+    FOutput.Emit({{"event", "warning"}, {"message", "cannot test the condition of breakpoint " +
+                                                        std::to_string(Breakpoint.Id) + ": " + Value}},
+                 "Error in testing the condition of breakpoint " + std::to_string(Breakpoint.Id) + ": " + Value);
+    return true;
+  }
+  // GDB answers a comparison with 0 or 1, a pointer in hex, a C++ bool as a word.
+  if (Value == "false")
+    return false;
+  char* End = nullptr;
+  const double Number = std::strtod(Value.c_str(), &End);
+  const long long Whole = std::strtoll(Value.c_str(), nullptr, 0);
+  return End == Value.c_str() || Number != 0 || Whole != 0;
 }
 
 void TCliSession::OnBreakpointVerified(Integer Id, bool Verified, Integer Number, const TGDBLocation& Location) {
@@ -194,8 +226,8 @@ bool TCliSession::OnException(Integer ThreadId, const TGDBException& Exception) 
 // --- Commands ----------------------------------------------------------------
 
 void TCliSession::CmdBreak(const std::string& Name, const std::vector<std::string>& Arguments) {
-  if (Arguments.size() != 1) {
-    FOutput.Error(Name, "usage: " + Name + " FILE:LINE | FUNCTION | *ADDRESS");
+  if (Arguments.empty() || (Arguments.size() > 1 && (Arguments[1] != "if" || Arguments.size() < 3))) {
+    FOutput.Error(Name, "usage: " + Name + " FILE:LINE | FUNCTION | *ADDRESS [if CONDITION]");
     return;
   }
   if (FState == TRunState::Exited || FState == TRunState::Detached || FState == TRunState::Lost) {
@@ -226,6 +258,10 @@ void TCliSession::CmdBreak(const std::string& Name, const std::vector<std::strin
       Process.CreateFunctionBreakpoint(Where, Listener);
     });
   }
+  // Only a hit told later meets the condition: the breakpoint was just made.
+  const auto Made = FBreakpoints.find(FNextBreakpoint - 1);
+  if (Arguments.size() > 2 && Made != FBreakpoints.end() && Made->second->Where == Where)
+    Made->second->Condition = JoinWords(Arguments, 2);
 }
 
 void TCliSession::CmdWatch(const std::string& Name, const std::vector<std::string>& Arguments) {
@@ -317,6 +353,7 @@ void TCliSession::CmdInfo(const std::string& Name, const std::vector<std::string
                             {"verified", Breakpoint->Verified},
                             {"hits", Breakpoint->Hits},
                             {"ignore", Breakpoint->IgnoreCount},
+                            {"condition", Breakpoint->Condition},
                             {"where", Breakpoint->Where}};
     nlohmann::json Locations = nlohmann::json::array();
     std::string Places;
@@ -354,6 +391,21 @@ void TCliSession::CmdIgnore(const std::string& Name, const std::vector<std::stri
   FOutput.Emit({{"answer", Name}, {"id", Breakpoint->Id}, {"ignore", Count}},
                "Will ignore the next " + std::to_string(Count) + " hits of breakpoint " +
                    std::to_string(Breakpoint->Id) + ".");
+}
+
+void TCliSession::CmdCondition(const std::string& Name, const std::vector<std::string>& Arguments) {
+  if (Arguments.empty()) {
+    FOutput.Error(Name, "usage: condition N [CONDITION]");
+    return;
+  }
+  TCliBreakpoint* Breakpoint = FindBreakpoint(Name, Arguments[0]);
+  if (!Breakpoint)
+    return;
+  Breakpoint->Condition = JoinWords(Arguments, 1);
+  FOutput.Emit({{"answer", Name}, {"id", Breakpoint->Id}, {"condition", Breakpoint->Condition}},
+               Breakpoint->Condition.empty()
+                   ? "Breakpoint " + std::to_string(Breakpoint->Id) + " now unconditional."
+                   : "Breakpoint " + std::to_string(Breakpoint->Id) + " stops where " + Breakpoint->Condition);
 }
 
 void TCliSession::CmdCatch(const std::string& Name, const std::vector<std::string>& Arguments) {

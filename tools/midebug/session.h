@@ -156,7 +156,10 @@ private:
 public:
   struct TCliBreakpoint;
   /// A hit of the session's breakpoint Id; the answer is whether to stop.
-  bool OnBreakpointHit(Integer Id);
+  bool OnBreakpointHit(Integer Id, Integer ThreadId);
+  /// True when the breakpoint has no condition, or it holds (or cannot be
+  /// tested) in the stopped thread's innermost frame.
+  bool ConditionHolds(const TCliBreakpoint& Breakpoint, Integer ThreadId);
   void OnBreakpointVerified(Integer Id, bool Verified, Integer Number, const TGDBLocation& Location);
 
 private:
@@ -166,6 +169,7 @@ private:
   void CmdEnable(const std::string& Name, const std::vector<std::string>& Arguments);
   void CmdInfo(const std::string& Name, const std::vector<std::string>& Arguments);
   void CmdIgnore(const std::string& Name, const std::vector<std::string>& Arguments);
+  void CmdCondition(const std::string& Name, const std::vector<std::string>& Arguments);
   void CmdCatch(const std::string& Name, const std::vector<std::string>& Arguments);
   using TPlace = std::function<void(IGDBProcess& Process, const TIntfPtr<IGDBBreakpointListener>& Listener)>;
   /// Registers a new breakpoint of the session and has Place set it.
