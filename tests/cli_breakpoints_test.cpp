@@ -57,7 +57,7 @@ TEST_F(CliBreakpoints, AConditionStopsOnlyWhereItHoldsAndOneThatCannotBeTestedSt
 TEST_F(CliBreakpoints, WatchStopsWhereTheWatchedBytesAreWrittenAndSaysWhichWatchpoint) {
   const std::string Address = test::Hex(test::SymbolAddress(Debuggee("breakpoints"), "counter"));
   const TCliRun Run = RunCli(Scratch, Quote(Debuggee("breakpoints")) + " 1",
-                   "start\nwatch " + Address + " 8\nwatch -r " + Address + " 8\ndelete 2\ncontinue\n" +
+                   "start\nwatch &counter 8\nwatch -r " + Address + " 8\ndelete 2\ncontinue\n" +
                        "continue\nwatch\nwatch -a 0x10 zero\n");
   const auto Stops = Run.All("event", "stopped");
   ASSERT_EQ(Stops.size(), 3u) << Run.Stdout;

@@ -40,7 +40,7 @@ TEST_F(CliMemory, ExamineWriteAndDisassemble) {
   const UInt64 Main = SymbolAddress(Program, "main");
   ASSERT_NE(Pattern, 0u);
   const std::vector<json> Answers = this->Answers("start\nx " + Hex(Pattern) + " 8\nwrite " + Hex(Pattern) +
-                                                  " 2a41\nx " + Hex(Pattern) + " 2\ndisassemble\ndisassemble " +
+                                                  " 2a41\nx &pattern 2\ndisassemble\ndisassemble " +
                                                   Hex(Main) + " 3\nx 0x10\nwrite 0x10 00\nx " + Hex(Pattern) +
                                                   " 0\nwrite 1 zz\ndisassemble 0x10\n");
   ASSERT_EQ(Answers.size(), 10u);

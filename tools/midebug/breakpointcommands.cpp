@@ -239,7 +239,7 @@ void TCliSession::CmdBreak(const std::string& Name, const std::vector<std::strin
   Integer Line = 0;
   UInt64 Address = 0;
   if (Where.starts_with("*")) {
-    if (!ParseAddress(Where.substr(1), Address)) {
+    if (!ResolveAddress(Where.substr(1), Address)) {
       FOutput.Error(Name, "not an address: " + Where.substr(1));
       return;
     }
@@ -272,7 +272,7 @@ void TCliSession::CmdWatch(const std::string& Name, const std::vector<std::strin
     Words.erase(Words.begin());
   UInt64 Address = 0;
   Integer Size = 0;
-  if (Words.empty() || Words.size() > 2 || !ParseAddress(Words[0], Address) ||
+  if (Words.empty() || Words.size() > 2 || !ResolveAddress(Words[0], Address) ||
       (Words.size() == 2 && (!ParseCount(Words[1], Size) || Size < 1))) {
     FOutput.Error(Name, "usage: watch [-r|-a] ADDRESS [SIZE]");
     return;

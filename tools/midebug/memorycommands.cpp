@@ -87,7 +87,7 @@ constexpr size_t SSEDataRegisters = 16;
 void TCliSession::CmdExamine(const std::string& Name, const std::vector<std::string>& Arguments) {
   UInt64 Address = 0;
   UInt64 Count = 64;
-  if (Arguments.empty() || Arguments.size() > 2 || !ParseUInt64(Arguments[0], Address) ||
+  if (Arguments.empty() || Arguments.size() > 2 || !ResolveAddress(Arguments[0], Address) ||
       (Arguments.size() == 2 && (!ParseUInt64(Arguments[1], Count) || Count == 0 || Count > MaxExamine))) {
     FOutput.Error(Name, "usage: x ADDRESS [COUNT], a number of 1 to " + std::to_string(MaxExamine) + " bytes");
     return;
@@ -125,7 +125,7 @@ void TCliSession::CmdWrite(const std::string& Name, const std::vector<std::strin
   UInt64 Address = 0;
   const bool HexText = Arguments.size() == 2 && !Arguments[1].empty() && Arguments[1].size() % 2 == 0 &&
                        Arguments[1].find_first_not_of("0123456789abcdefABCDEF") == std::string::npos;
-  if (!HexText || !ParseUInt64(Arguments[0], Address) || Arguments[1].size() / 2 > MaxExamine) {
+  if (!HexText || !ResolveAddress(Arguments[0], Address) || Arguments[1].size() / 2 > MaxExamine) {
     FOutput.Error(Name, "usage: write ADDRESS HEXBYTES, two hexadecimal digits a byte (\"90c3\")");
     return;
   }
@@ -147,7 +147,7 @@ void TCliSession::CmdWrite(const std::string& Name, const std::vector<std::strin
 void TCliSession::CmdDisassemble(const std::string& Name, const std::vector<std::string>& Arguments) {
   UInt64 Address = 0;
   UInt64 Count = 20;
-  if (Arguments.size() > 2 || (!Arguments.empty() && !ParseUInt64(Arguments[0], Address)) ||
+  if (Arguments.size() > 2 || (!Arguments.empty() && !ResolveAddress(Arguments[0], Address)) ||
       (Arguments.size() == 2 && (!ParseUInt64(Arguments[1], Count) || Count == 0 || Count > MaxInstructions))) {
     FOutput.Error(Name, "usage: disassemble [ADDRESS] [COUNT], a count of 1 to " +
                             std::to_string(MaxInstructions) + " instructions");
@@ -203,6 +203,23 @@ void TCliSession::CmdDisassemble(const std::string& Name, const std::vector<std:
   }
   Text.pop_back();
   FOutput.Emit({{"answer", Name}, {"instructions", Instructions}}, Text);
+}
+
+bool TCliSession::ResolveAddress(const std::string& Text, UInt64& Address) {
+  if (ParseUInt64(Text, Address))
+    return true;
+  // Any other word is an expression of the stopped program: its value (a
+  // pointer "(int *) 0x4010 <counter>", or a number) is the address.
+  const TIntfPtr<IGDBThread> Thread =
+      FProcess && FState == TRunState::Stopped ? FProcess->GetThread(FCurrentThread) : nullptr;
+  std::string Value, TypeName;
+  bool CanModify = false;
+  if (!Thread || Thread->Evaluate(Text, "", FCurrentFrame + 1, Value, CanModify, TypeName) != ercOk)
+    return false;
+  const size_t Hex = Value.find("0x");
+  const size_t Start = Hex == std::string::npos ? 0 : Hex;
+  const size_t End = Value.find_first_of(" \t", Start);
+  return ParseUInt64(Value.substr(Start, End == std::string::npos ? End : End - Start), Address);
 }
 
 void TCliSession::CmdInfoRegisters(const std::string& Name, const std::vector<std::string>& Arguments) {

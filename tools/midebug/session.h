@@ -121,6 +121,9 @@ private:
   void CmdDisassemble(const std::string& Name, const std::vector<std::string>& Arguments);
   void CmdInfoRegisters(const std::string& Name, const std::vector<std::string>& Arguments);
   void CmdSetRegister(const std::string& Name, const std::vector<std::string>& Arguments);
+  /// A number, or the value of an expression (no blanks) of the stopped
+  /// program: "0x4010", "&counter", "buf+8"; false when neither.
+  bool ResolveAddress(const std::string& Text, UInt64& Address);
   // --- End of memory, disassembly and registers ----------------------------
   // --- Source lines (sourcecommands.cpp) ---------------------------------
   void CmdList(const std::string& Name, const std::vector<std::string>& Arguments);
