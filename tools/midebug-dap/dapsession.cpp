@@ -285,7 +285,10 @@ Integer TDapSession::Send(nlohmann::json Message) {
   // Invalid UTF-8 from the program or the debugger is replaced, not thrown.
   const std::string Body = Message.dump(-1, ' ', false, nlohmann::json::error_handler_t::replace);
   // A client that has gone is noticed when its end of the input closes.
-  WriteStandardOutput(FrameMessage(Body));
+  if (FWriter)
+    FWriter(FrameMessage(Body));
+  else
+    WriteStandardOutput(FrameMessage(Body));
   return FSequence;
 }
 

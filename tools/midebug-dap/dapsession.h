@@ -10,6 +10,7 @@
 #include <nlohmann/json.hpp>
 
 #include <chrono>
+#include <functional>
 #include <optional>
 #include <set>
 #include <string>
@@ -101,6 +102,8 @@ public:
   void HandleGarbage(const std::string& What);
   /// The client closed its end: the program and the debugger go.
   void HandleClientGone();
+  /// Where the messages to the client go; standard output unless set.
+  void SetWriter(std::function<void(const std::string&)> Writer) { FWriter = std::move(Writer); }
   /// True once the session is over and the adapter may exit.
   bool Finished() const { return FFinished; }
   /// Ends the program if it still runs (a launched one) or lets it go (an
@@ -182,6 +185,7 @@ private:
   Integer ClientLine(Integer Line) const { return FLinesStartAt1 ? Line : Line - 1; }
   Integer FrameHandle(Integer ThreadId, Integer Level);
 
+  std::function<void(const std::string&)> FWriter;
   TIntfPtr<TDapListener> FListener;
   TIntfPtr<IGDBProcess> FProcess;
   TProgramState FState = TProgramState::None;
