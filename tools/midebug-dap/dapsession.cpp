@@ -162,6 +162,8 @@ const std::vector<TDapSession::TRequestEntry>& TDapSession::Requests() {
       {"stepOut", &TDapSession::StepOut},
       {"pause", &TDapSession::Pause},
       {"cancel", &TDapSession::Cancel},
+      {"readMemory", &TDapSession::ReadMemory},
+      {"writeMemory", &TDapSession::WriteMemory},
       // Served once the library offers breakpoints, source lines and
       // evaluation to this adapter.
       {"setBreakpoints", &TDapSession::NotYetServed},
@@ -252,6 +254,10 @@ void TDapSession::Dispatch(const nlohmann::json& Request) {
     Respond(Request, Reply);
     if (Name == "initialize" && Reply.Success)
       SendEvent("initialized");
+    if (FPendingMemoryEvent) {
+      const auto [Address, Count] = *std::exchange(FPendingMemoryEvent, std::nullopt);
+      SendEvent("memory", {{"memoryReference", HexAddress(Address)}, {"offset", 0}, {"count", Count}});
+    }
     return;
   }
   Respond(Request, TDapReply::Refuse("midebug-dap does not know the request '" + Name + "'"));
@@ -318,6 +324,8 @@ TDapReply TDapSession::Initialize(TDapArguments& Arguments) {
       {"supportsCancelRequest", true},
       {"supportsSteppingGranularity", true},
       {"supportsDelayedStackTraceLoading", true},
+      {"supportsReadMemoryRequest", true},
+      {"supportsWriteMemoryRequest", true},
       {"supportsFunctionBreakpoints", false},
       {"supportsConditionalBreakpoints", false},
       {"supportsEvaluateForHovers", false},

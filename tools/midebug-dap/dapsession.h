@@ -61,6 +61,11 @@ public:
   const nlohmann::json* Object(const char* Name);
   /// A list of strings.
   std::optional<TStringArray> Strings(const char* Name);
+  /// Makes Message the request's problem unless it already has one.
+  void Refuse(const std::string& Message) {
+    if (FProblem.empty())
+      FProblem = Message;
+  }
   /// The first argument that had a wrong type or value; empty when none.
   const std::string& Problem() const { return FProblem; }
 
@@ -143,6 +148,11 @@ private:
   TDapReply StepOut(TDapArguments& Arguments);
   TDapReply Pause(TDapArguments& Arguments);
   TDapReply Cancel(TDapArguments& Arguments);
+  // Memory (dapmemory.cpp).
+  TDapReply ReadMemory(TDapArguments& Arguments);
+  TDapReply WriteMemory(TDapArguments& Arguments);
+  /// memoryReference plus offset; nullopt with the problem set.
+  std::optional<UInt64> MemoryAddress(TDapArguments& Arguments);
   /// The requests whose library operations are still to come.
   TDapReply NotYetServed(TDapArguments& Arguments);
 
@@ -212,6 +222,8 @@ private:
   bool FPausePending = false;
   /// What the last signal or exception said, for the stop that follows it.
   std::optional<std::pair<std::string, nlohmann::json>> FPendingStop;
+  /// The bytes a request changed, announced once it is answered.
+  std::optional<std::pair<UInt64, Integer>> FPendingMemoryEvent;
   bool FLinesStartAt1 = true;
   bool FColumnsStartAt1 = true;
   bool FEnding = false;
