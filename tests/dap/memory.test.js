@@ -1,5 +1,6 @@
 // Memory requests: a read across the end of readable memory returns the
 // readable part and counts the rest; a write reads back and is announced.
+// The modules request lists what module events announced.
 'use strict';
 
 const assert = require('node:assert/strict');
@@ -20,7 +21,7 @@ function endBeforeGap(pid) {
   return found.end;
 }
 
-test('memory reads stop at unreadable bytes and a write reads back with a memory event', async () => {
+test('memory reads stop at unreadable bytes, a write reads back with a memory event; modules are listed', async () => {
   const dir = s.scratchDir();
   const client = await s.startClient(dir);
   try {
@@ -49,6 +50,12 @@ test('memory reads stop at unreadable bytes and a write reads back with a memory
 
     await assert.rejects(client.send('writeMemory', { memoryReference: before, data: 'not*base64' }), /base64/);
     await assert.rejects(client.send('readMemory', { memoryReference: 'main', count: 4 }), /memoryReference/);
+
+    const modules = (await client.send('modules', {})).body;
+    assert.equal(modules.totalModules, modules.modules.length);
+    assert.ok(modules.modules.some((module) => /libc\.so/.test(module.path || module.name)), JSON.stringify(modules));
+    const page = (await client.send('modules', { startModule: 1, moduleCount: 1 })).body;
+    assert.deepEqual(page.modules, [modules.modules[1]]);
   } finally {
     await client.stop();
     fs.rmSync(dir, { recursive: true, force: true });

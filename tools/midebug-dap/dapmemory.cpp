@@ -1,5 +1,6 @@
 // The adapter's memory requests: reads that report what could not be read
-// rather than failing whole, and writes that tell the client what changed.
+// rather than failing whole, and writes that tell the client what changed;
+// and the modules the program has loaded.
 
 #include "dapsession.h"
 
@@ -126,6 +127,19 @@ TDapReply TDapSession::WriteMemory(TDapArguments& Arguments) {
     return TDapReply::Refuse("the memory at " + HexAddress(*Address) + " could not be written");
   FPendingMemoryEvent = {*Address, Written};
   return TDapReply::Ok({{"bytesWritten", Written}});
+}
+
+TDapReply TDapSession::Modules(TDapArguments& Arguments) {
+  const auto Start = Arguments.Number("startModule", 0, 0x7fffffff).value_or(0);
+  const auto Count = Arguments.Number("moduleCount", 0, 0x7fffffff).value_or(0);
+  if (!Arguments.Problem().empty())
+    return TDapReply::Refuse(Arguments.Problem());
+  nlohmann::json List = nlohmann::json::array();
+  long long Index = 0;
+  for (const auto& [Id, Module] : FModules)
+    if (Index++ >= Start && (Count == 0 || static_cast<long long>(List.size()) < Count))
+      List.push_back(Module);
+  return TDapReply::Ok({{"modules", std::move(List)}, {"totalModules", FModules.size()}});
 }
 
 } // namespace midebug::dap

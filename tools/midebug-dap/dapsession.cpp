@@ -164,6 +164,7 @@ const std::vector<TDapSession::TRequestEntry>& TDapSession::Requests() {
       {"cancel", &TDapSession::Cancel},
       {"readMemory", &TDapSession::ReadMemory},
       {"writeMemory", &TDapSession::WriteMemory},
+      {"modules", &TDapSession::Modules},
       // Served once the library offers breakpoints, source lines and
       // evaluation to this adapter.
       {"setBreakpoints", &TDapSession::NotYetServed},
@@ -326,6 +327,7 @@ TDapReply TDapSession::Initialize(TDapArguments& Arguments) {
       {"supportsDelayedStackTraceLoading", true},
       {"supportsReadMemoryRequest", true},
       {"supportsWriteMemoryRequest", true},
+      {"supportsModulesRequest", true},
       {"supportsFunctionBreakpoints", false},
       {"supportsConditionalBreakpoints", false},
       {"supportsEvaluateForHovers", false},

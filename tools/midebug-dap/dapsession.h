@@ -11,6 +11,7 @@
 
 #include <chrono>
 #include <functional>
+#include <map>
 #include <optional>
 #include <set>
 #include <string>
@@ -151,6 +152,7 @@ private:
   // Memory (dapmemory.cpp).
   TDapReply ReadMemory(TDapArguments& Arguments);
   TDapReply WriteMemory(TDapArguments& Arguments);
+  TDapReply Modules(TDapArguments& Arguments);
   /// memoryReference plus offset; nullopt with the problem set.
   std::optional<UInt64> MemoryAddress(TDapArguments& Arguments);
   /// The requests whose library operations are still to come.
@@ -224,6 +226,8 @@ private:
   std::optional<std::pair<std::string, nlohmann::json>> FPendingStop;
   /// The bytes a request changed, announced once it is answered.
   std::optional<std::pair<UInt64, Integer>> FPendingMemoryEvent;
+  /// The modules loaded now, as module events described them, by id.
+  std::map<Integer, nlohmann::json> FModules;
   bool FLinesStartAt1 = true;
   bool FColumnsStartAt1 = true;
   bool FEnding = false;
