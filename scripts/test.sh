@@ -26,6 +26,6 @@ ASAN_OPTIONS=detect_leaks=1:abort_on_error=1 UBSAN_OPTIONS=print_stacktrace=1:ha
 echo "== ThreadSanitizer build"
 TSAN_OPTIONS=halt_on_error=1:second_deadlock_stack=1 \
   run_suite build-tsan -DCMAKE_BUILD_TYPE=RelWithDebInfo -DMIDEBUG_SANITIZE=tsan -DMIDEBUG_BENCHMARKS=OFF
-echo "== fuzzing the MI output parser"
-scripts/fuzz.sh 60
+echo "== fuzzing the MI output parser and the debug adapter's input"
+scripts/fuzz.sh 30
 echo "All tests passed."

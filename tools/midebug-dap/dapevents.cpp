@@ -207,6 +207,10 @@ void TDapSession::OnModule(const TGDBModule& Module, bool Loaded) {
         Hex.insert(Hex.begin(), Digits[Value & 0xF]);
       return Hex;
     }();
+  if (Loaded)
+    FModules[Module.Id] = Entry;
+  else
+    FModules.erase(Module.Id);
   SendEvent("module", {{"reason", Loaded ? "new" : "removed"}, {"module", Entry}});
 }
 

@@ -172,6 +172,9 @@ const std::vector<TDapSession::TRequestEntry>& TDapSession::Requests() {
       {"evaluate", &TDapSession::Evaluate},
       {"setVariable", &TDapSession::SetVariable},
       {"setExpression", &TDapSession::SetExpression},
+      {"readMemory", &TDapSession::ReadMemory},
+      {"writeMemory", &TDapSession::WriteMemory},
+      {"modules", &TDapSession::Modules},
   };
   return Table;
 }
@@ -251,6 +254,10 @@ void TDapSession::Dispatch(const nlohmann::json& Request) {
     Respond(Request, Reply);
     if (Name == "initialize" && Reply.Success)
       SendEvent("initialized");
+    if (FPendingMemoryEvent) {
+      const auto [Address, Count] = *std::exchange(FPendingMemoryEvent, std::nullopt);
+      SendEvent("memory", {{"memoryReference", HexAddress(Address)}, {"offset", 0}, {"count", Count}});
+    }
     return;
   }
   Respond(Request, TDapReply::Refuse("midebug-dap does not know the request '" + Name + "'"));
@@ -284,7 +291,10 @@ Integer TDapSession::Send(nlohmann::json Message) {
   // Invalid UTF-8 from the program or the debugger is replaced, not thrown.
   const std::string Body = Message.dump(-1, ' ', false, nlohmann::json::error_handler_t::replace);
   // A client that has gone is noticed when its end of the input closes.
-  WriteStandardOutput(FrameMessage(Body));
+  if (FWriter)
+    FWriter(FrameMessage(Body));
+  else
+    WriteStandardOutput(FrameMessage(Body));
   return FSequence;
 }
 
@@ -328,6 +338,9 @@ TDapReply TDapSession::Initialize(TDapArguments& Arguments) {
        {{{"filter", "cpp_throw"}, {"label", "C++: on throw"}, {"default", false}},
         {{"filter", "cpp_catch"}, {"label", "C++: on catch"}, {"default", false}},
         {{"filter", "pascal_raise"}, {"label", "Pascal: on raise"}, {"default", false}}}},
+      {"supportsReadMemoryRequest", true},
+      {"supportsWriteMemoryRequest", true},
+      {"supportsModulesRequest", true},
   });
 }
 

@@ -10,6 +10,7 @@
 #include <nlohmann/json.hpp>
 
 #include <chrono>
+#include <functional>
 #include <map>
 #include <memory>
 #include <optional>
@@ -66,6 +67,11 @@ public:
   std::optional<TStringArray> Strings(const char* Name);
   /// The argument as it is; null when absent.
   const nlohmann::json* Value(const char* Name) { return Find(Name); }
+  /// Makes Message the request's problem unless it already has one.
+  void Refuse(const std::string& Message) {
+    if (FProblem.empty())
+      FProblem = Message;
+  }
   /// The first argument that had a wrong type or value; empty when none.
   const std::string& Problem() const { return FProblem; }
 
@@ -107,6 +113,8 @@ public:
   void HandleGarbage(const std::string& What);
   /// The client closed its end: the program and the debugger go.
   void HandleClientGone();
+  /// Where the messages to the client go; standard output unless set.
+  void SetWriter(std::function<void(const std::string&)> Writer) { FWriter = std::move(Writer); }
   /// True once the session is over and the adapter may exit.
   bool Finished() const { return FFinished; }
   /// Ends the program if it still runs (a launched one) or lets it go (an
@@ -216,6 +224,13 @@ private:
   TDapReply Assign(const TIntfPtr<IGDBThread>& Thread, Integer Frame, const std::string& Expr,
                    const std::string& Value, bool Hex);
 
+  // Memory (dapmemory.cpp).
+  TDapReply ReadMemory(TDapArguments& Arguments);
+  TDapReply WriteMemory(TDapArguments& Arguments);
+  TDapReply Modules(TDapArguments& Arguments);
+  /// memoryReference plus offset; nullopt with the problem set.
+  std::optional<UInt64> MemoryAddress(TDapArguments& Arguments);
+
   /// A response to the adapter's own request.
   void HandleResponse(const nlohmann::json& Response);
   /// Runs the request's handler and answers it.
@@ -255,6 +270,7 @@ private:
   Integer ClientLine(Integer Line) const { return FLinesStartAt1 ? Line : Line - 1; }
   Integer FrameHandle(Integer ThreadId, Integer Level);
 
+  std::function<void(const std::string&)> FWriter;
   TIntfPtr<TDapListener> FListener;
   TIntfPtr<IGDBProcess> FProcess;
   TProgramState FState = TProgramState::None;
@@ -281,6 +297,10 @@ private:
   bool FPausePending = false;
   /// What the last signal or exception said, for the stop that follows it.
   std::optional<std::pair<std::string, nlohmann::json>> FPendingStop;
+  /// The bytes a request changed, announced once it is answered.
+  std::optional<std::pair<UInt64, Integer>> FPendingMemoryEvent;
+  /// The modules loaded now, as module events described them, by id.
+  std::map<Integer, nlohmann::json> FModules;
   bool FLinesStartAt1 = true;
   bool FColumnsStartAt1 = true;
   bool FEnding = false;
