@@ -58,9 +58,9 @@ test('initialize advertises what is served, and the rest is refused in words', a
     for (const served of ['supportsConfigurationDoneRequest', 'supportsTerminateRequest', 'supportsCancelRequest',
                           'supportsSteppingGranularity', 'supportsDelayedStackTraceLoading', 'supportTerminateDebuggee',
                           'supportsFunctionBreakpoints', 'supportsConditionalBreakpoints', 'supportsSetVariable',
-                          'supportsEvaluateForHovers', 'supportsHitConditionalBreakpoints', 'supportsLogPoints'])
+                          'supportsEvaluateForHovers', 'supportsHitConditionalBreakpoints', 'supportsLogPoints', 'supportsReadMemoryRequest'])
       assert.equal(capabilities[served], true, served);
-    for (const missing of ['supportsDataBreakpoints', 'supportsReadMemoryRequest', 'supportsRestartRequest'])
+    for (const missing of ['supportsDataBreakpoints', 'supportsRestartRequest'])
       assert.notEqual(capabilities[missing], true, missing);
     await assert.rejects(client.initializeRequest({ adapterID: 'midebug' }), /already/);
 
