@@ -79,9 +79,7 @@ void TCliSession::CmdPrint(const std::string& Name, const std::vector<std::strin
     FOutput.Error(Name, "usage: print[/x|/d|/c] EXPRESSION");
     return;
   }
-  if (!RequireStopped(Name))
-    return;
-  const TIntfPtr<IGDBThread> Thread = CurrentThread(Name);
+  const TIntfPtr<IGDBThread> Thread = StoppedThread(Name);
   if (!Thread)
     return;
   const std::string Format = Name.size() > 6 ? Name.substr(6) : std::string();
@@ -108,9 +106,7 @@ void TCliSession::CmdSetVar(const std::string& Name, const std::vector<std::stri
     FOutput.Error(Name, "usage: set var EXPRESSION = VALUE");
     return;
   }
-  if (!RequireStopped(Name))
-    return;
-  const TIntfPtr<IGDBThread> Thread = CurrentThread(Name);
+  const TIntfPtr<IGDBThread> Thread = StoppedThread(Name);
   if (!Thread)
     return;
   std::string Value, TypeName;
@@ -127,15 +123,12 @@ void TCliSession::CmdSetVar(const std::string& Name, const std::vector<std::stri
 }
 
 void TCliSession::CmdInfoValues(const std::string& Name, const std::vector<std::string>& /*Arguments*/) {
-  const std::string& Answer = Name;
-  if (!RequireStopped(Answer))
-    return;
-  const TIntfPtr<IGDBThread> Thread = CurrentThread(Answer);
+  const TIntfPtr<IGDBThread> Thread = StoppedThread(Name);
   if (!Thread)
     return;
   const TIntfPtr<IGDBInspect> Locals = Thread->CreateLocalVarsInspector(FCurrentFrame + 1);
   if (!Locals || Locals->HasError()) {
-    FOutput.Error(Answer, Locals ? Locals->GetLastError() : "no locals view");
+    FOutput.Error(Name, Locals ? Locals->GetLastError() : "no locals view");
     return;
   }
   // The view holds the arguments first, then the locals.
@@ -153,7 +146,7 @@ void TCliSession::CmdInfoValues(const std::string& Name, const std::vector<std::
     Variables.push_back({{"name", Member}, {"type", TypeName}, {"value", Value}});
     Text += (Text.empty() ? "" : "\n") + Member + " = " + Value;
   }
-  FOutput.Emit({{"answer", Answer}, {"variables", Variables}},
+  FOutput.Emit({{"answer", Name}, {"variables", Variables}},
                Text.empty() ? (WantArguments ? "No arguments." : "No locals.") : Text);
 }
 
@@ -169,9 +162,7 @@ void TCliSession::CmdInspect(const std::string& Name, const std::vector<std::str
     FOutput.Error(Name, "usage: inspect EXPRESSION [FROM COUNT]");
     return;
   }
-  if (!RequireStopped(Name))
-    return;
-  const TIntfPtr<IGDBThread> Thread = CurrentThread(Name);
+  const TIntfPtr<IGDBThread> Thread = StoppedThread(Name);
   if (!Thread)
     return;
   const TIntfPtr<IGDBInspect> Inspector = Thread->CreateInspector(Expr, FCurrentFrame + 1);

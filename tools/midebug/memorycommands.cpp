@@ -153,9 +153,7 @@ void TCliSession::CmdDisassemble(const std::string& Name, const std::vector<std:
                             std::to_string(MaxInstructions) + " instructions");
     return;
   }
-  if (!RequireStopped(Name))
-    return;
-  TIntfPtr<IGDBThread> Thread = CurrentThread(Name);
+  const TIntfPtr<IGDBThread> Thread = StoppedThread(Name);
   if (!Thread)
     return;
   const UInt64 Current = Thread->GetCallLocation(FCurrentFrame + 1).Address;
@@ -228,9 +226,7 @@ void TCliSession::CmdInfoRegisters(const std::string& Name, const std::vector<st
     FOutput.Error(Name, "usage: info registers [general|fpu|sse|NAME]");
     return;
   }
-  if (!RequireStopped(Name))
-    return;
-  TIntfPtr<IGDBThread> Thread = CurrentThread(Name);
+  const TIntfPtr<IGDBThread> Thread = StoppedThread(Name);
   if (!Thread)
     return;
   const TGDBCPU CPU = Thread->GetCPUType();
@@ -289,9 +285,7 @@ void TCliSession::CmdSetRegister(const std::string& Name, const std::vector<std:
     FOutput.Error(Name, "usage: set register NAME VALUE");
     return;
   }
-  if (!RequireStopped(Name))
-    return;
-  TIntfPtr<IGDBThread> Thread = CurrentThread(Name);
+  const TIntfPtr<IGDBThread> Thread = StoppedThread(Name);
   if (!Thread)
     return;
   const std::string& Register = Arguments[0];

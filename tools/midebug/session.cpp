@@ -437,7 +437,9 @@ bool TCliSession::RequireStopped(const std::string& Name) {
   }
 }
 
-TIntfPtr<IGDBThread> TCliSession::CurrentThread(const std::string& Name) {
+TIntfPtr<IGDBThread> TCliSession::StoppedThread(const std::string& Name) {
+  if (!RequireStopped(Name))
+    return nullptr;
   if (FCurrentThread < 0)
     FCurrentThread = FProcess->GetSuspendedThreadId();
   TIntfPtr<IGDBThread> Thread = FCurrentThread < 0 ? nullptr : FProcess->GetThread(FCurrentThread);
@@ -488,9 +490,7 @@ void TCliSession::CmdContinue(const std::string& Name, const std::vector<std::st
 }
 
 void TCliSession::CmdStep(const std::string& Name, const std::vector<std::string>& /*Arguments*/) {
-  if (!RequireStopped(Name))
-    return;
-  TIntfPtr<IGDBThread> Thread = CurrentThread(Name);
+  const TIntfPtr<IGDBThread> Thread = StoppedThread(Name);
   if (!Thread)
     return;
   ResumeAndWait(Name, [&] {
@@ -526,9 +526,7 @@ void TCliSession::CmdBacktrace(const std::string& Name, const std::vector<std::s
       return;
     }
   }
-  if (!RequireStopped(Name))
-    return;
-  TIntfPtr<IGDBThread> Thread = CurrentThread(Name);
+  const TIntfPtr<IGDBThread> Thread = StoppedThread(Name);
   if (!Thread)
     return;
   const Integer Count = Thread->GetCallCount();
@@ -624,9 +622,7 @@ void TCliSession::CmdFrame(const std::string& Name, const std::vector<std::strin
     FOutput.Error(Name, "usage: frame N (0 is the innermost frame)");
     return;
   }
-  if (!RequireStopped(Name))
-    return;
-  TIntfPtr<IGDBThread> Thread = CurrentThread(Name);
+  const TIntfPtr<IGDBThread> Thread = StoppedThread(Name);
   if (!Thread)
     return;
   if (Level >= Thread->GetCallCount()) {

@@ -196,8 +196,9 @@ private:
   bool RequireStopped(const std::string& Name);
   /// True when 'run' or 'start' may start the program; otherwise prints why.
   bool RequireStartable(const std::string& Name);
-  /// The thread commands act on, or null with the reason printed.
-  TIntfPtr<IGDBThread> CurrentThread(const std::string& Name);
+  /// The thread commands act on while the program is stopped, or null with
+  /// the reason printed.
+  TIntfPtr<IGDBThread> StoppedThread(const std::string& Name);
   /// Calls Resume (which starts or resumes the program), then pumps the
   /// main-thread queue until the program stops, exits or the debugger is
   /// lost, or the wait limit passes; then answers Name.

@@ -158,9 +158,7 @@ void TCliSession::CmdJump(const std::string& Name, const std::vector<std::string
     FOutput.Error(Name, "usage: jump LINE");
     return;
   }
-  if (!RequireStopped(Name))
-    return;
-  TIntfPtr<IGDBThread> Thread = CurrentThread(Name);
+  const TIntfPtr<IGDBThread> Thread = StoppedThread(Name);
   if (!Thread)
     return;
   // The next statement is the innermost frame's.
