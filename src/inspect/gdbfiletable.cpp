@@ -84,7 +84,7 @@ Integer TGDBFileTable::AddFileName(const std::string& FileName, bool Windows) {
     return Known->second;
   if (FFileNameArray.size() <= static_cast<size_t>(FFileNameIndex))
     FFileNameArray.resize(FFileNameArray.size() + FileNameArrayStep);
-  // Windows targets keep the design's one spelling of a path.
+  // Windows targets keep one spelling of a path, with backslashes.
   FFileNameArray[static_cast<size_t>(FFileNameIndex)] = Windows ? WithWindowsSeparators(FileName) : FileName;
   ++FFileNameIndex;
   FFileNameList.emplace(FileKey, FFileNameIndex);

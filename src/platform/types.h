@@ -1,6 +1,6 @@
 #pragma once
 /// \file
-/// The scalar types of the design and the dynamic arrays shared by every
+/// The scalar types and the dynamic arrays shared by every
 /// subsystem. Text is UTF-8 held in std::string; positions count bytes.
 
 #include <cstdint>
