@@ -64,15 +64,7 @@ TGDBInspect::TGDBInspect(const std::string& Expr, UInt64 Address, TGDBProcess& P
     FLastError = Created.FErrorMessage;
     return;
   }
-  FType = Created.FType;
-  FValue = Created.FValue;
-  FValueDefined = Created.FValueDefined;
-  FEditable = Created.FEditable;
-  FAutoDelete = false;
-  SetName(Created.FName, false);
-  FDynamic = Created.FDynamic;
-  FMapHint = Created.FDisplayHint == "map";
-  SetNumChildren(FDynamic && Created.FHasMore ? 1 : Created.FNumChild);
+  Adopt(Created);
 }
 
 TGDBInspect::~TGDBInspect() {
@@ -266,15 +258,7 @@ TIntfPtr<TGDBInspect> TGDBInspect::GetChildren(Integer Index) {
   return Child;
 }
 
-void TGDBInspect::CreateVariableObject() {
-  TVarCreateResult Created;
-  Evaluator().VarCreate(FExpr, 0, Created);
-  FError = Created.FError;
-  if (Created.FError) {
-    FValueDefined = true;
-    FLastError = Created.FErrorMessage;
-    return;
-  }
+void TGDBInspect::Adopt(const TVarCreateResult& Created) {
   FType = Created.FType;
   FValue = Created.FValue;
   FValueDefined = Created.FValueDefined;
@@ -284,6 +268,18 @@ void TGDBInspect::CreateVariableObject() {
   FDynamic = Created.FDynamic;
   FMapHint = Created.FDisplayHint == "map";
   SetNumChildren(FDynamic && Created.FHasMore ? 1 : Created.FNumChild);
+}
+
+void TGDBInspect::CreateVariableObject() {
+  TVarCreateResult Created;
+  Evaluator().VarCreate(FExpr, 0, Created);
+  FError = Created.FError;
+  if (Created.FError) {
+    FValueDefined = true;
+    FLastError = Created.FErrorMessage;
+    return;
+  }
+  Adopt(Created);
 }
 
 void TGDBInspect::FetchValueAndAttribute() {

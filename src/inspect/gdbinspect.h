@@ -64,6 +64,9 @@ protected:
 
   void SetName(const std::string& Name, bool Register);
   void SetNumChildren(Integer Count);
+  /// Takes the variable object the debugger made: its name, type, value and
+  /// children.
+  void Adopt(const TVarCreateResult& Created);
   void FetchValueAndAttribute();
   /// Gives an inspector without a variable object one, in its frame.
   void CreateVariableObject();

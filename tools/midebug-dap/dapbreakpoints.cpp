@@ -197,6 +197,10 @@ TDapReply TDapSession::SetBreakpoints(TDapArguments& Arguments) {
     Set.back()->Source = File;
     FBreakpoints[Set.back()->Id] = Set.back();
   }
+  return PlaceAndAnswer(Set);
+}
+
+TDapReply TDapSession::PlaceAndAnswer(const std::vector<std::shared_ptr<TBreakpoint>>& Set) {
   FPlacingForResponse = true;
   if (FProcess && !ProgramGone())
     for (const auto& Breakpoint : Set)
@@ -218,15 +222,7 @@ TDapReply TDapSession::SetFunctionBreakpoints(TDapArguments& Arguments) {
     Set.push_back(ReadBreakpoint(Entry, true));
     FBreakpoints[Set.back()->Id] = Set.back();
   }
-  FPlacingForResponse = true;
-  if (FProcess && !ProgramGone())
-    for (const auto& Breakpoint : Set)
-      PlaceBreakpoint(*Breakpoint);
-  FPlacingForResponse = false;
-  nlohmann::json Answer = nlohmann::json::array();
-  for (const auto& Breakpoint : Set)
-    Answer.push_back(BreakpointJson(*Breakpoint));
-  return TDapReply::Ok({{"breakpoints", Answer}});
+  return PlaceAndAnswer(Set);
 }
 
 TDapReply TDapSession::SetExceptionBreakpoints(TDapArguments& Arguments) {

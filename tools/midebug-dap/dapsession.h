@@ -197,6 +197,9 @@ private:
   void PlaceBreakpoints();
   void RemoveBreakpoints(bool Functions, const std::string& Source);
   nlohmann::json BreakpointJson(const TBreakpoint& Breakpoint) const;
+  /// Places a set request's breakpoints where the program is there, and
+  /// answers their verdicts (no events meanwhile).
+  TDapReply PlaceAndAnswer(const std::vector<std::shared_ptr<TBreakpoint>>& Set);
   /// The text of a log message with each {expression} evaluated.
   std::string Interpolate(IGDBThread& Thread, const std::string& Message);
 
