@@ -50,6 +50,12 @@ int RunAndPrintRatios(int argc, char** argv, const std::vector<std::pair<std::st
   return 0;
 }
 
+std::string Hex(UInt64 Address) {
+  char Text[24];
+  std::snprintf(Text, sizeof Text, "0x%016llX", static_cast<unsigned long long>(Address));
+  return Text;
+}
+
 TRawGdbPipes::~TRawGdbPipes() {
   if (FPid == -1)
     return;

@@ -65,6 +65,10 @@ private:
   Integer FPid = -1;
 };
 
+/// Address as the library writes it into MI: "0x" and 16 upper-case hex
+/// digits.
+std::string Hex(UInt64 Address);
+
 /// Runs every registered benchmark (honouring the command-line options), then
 /// prints, for each pair, the first's mean real time per iteration divided by
 /// the second's. Returns the process exit code.

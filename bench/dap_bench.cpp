@@ -2,8 +2,12 @@
 // the same program: (a) from starting the adapter (or GDB) to the first stop
 // at main; (b) 200 times a step over a line, its stop and a stack trace of
 // 20 frames; (c) a 5,000-element array evaluated and read through
-// `variables` in pages of 100. Each is measured in 5 rounds; the medians and
-// their ratios are printed.
+// `variables` in pages of 100; (d) 64 KiB of a global array read through
+// `readMemory` in 16 requests of 4 KiB, each answered before the next is
+// sent; (e) 200 instructions of a long function through `disassemble`. Each
+// is measured in 5 rounds; the medians and their ratios are printed. The
+// adapter's log shows the MI each request costs, and GDB over pipes is sent
+// the same lines.
 
 #include "benchsupport.h"
 #include "dapframing.h"
@@ -34,8 +38,18 @@ constexpr int TraceLevels = 20;
 constexpr int ArraySize = 5000;
 constexpr int PageSize = 100;
 
-/// 20 calls deep, a long loop to step through, and an array to read.
+constexpr int MemoryChunk = 4096;
+constexpr int MemoryChunks = 16;
+constexpr int DisassembledInstructions = 200;
+/// The adapter asks GDB for this many bytes of code per instruction wanted.
+constexpr int BytesPerInstruction = 6;
+
+/// 20 calls deep, a long loop to step through, an array to read, 64 KiB of
+/// page-aligned memory (so no 4 KiB read ends one byte into a page) and a
+/// function long enough that the 1,200 bytes after its start are all its
+/// own code.
 constexpr const char* SteppedProgram = R"(int numbers[5000] = {1, 2, 3};
+unsigned char memory[65536] __attribute__((aligned(4096))) = {1, 2, 3};
 static void spin(void) {
   volatile long total = 0;
   for (long i = 0; i < 100000000; ++i) {
@@ -58,7 +72,13 @@ int main(void) {
 std::string BuildSteppedProgram() {
   const std::filesystem::path Dir = std::filesystem::temp_directory_path() / "midebug-dap-bench";
   std::filesystem::create_directories(Dir);
-  std::ofstream(Dir / "stepped.c") << SteppedProgram;
+  // The long function, one statement a line as a user's code reads: about
+  // 29 bytes of code a line unoptimised, so 64 lines pass 1,200 bytes.
+  std::string Mix = "int mix(int a, int b) {\n";
+  for (int Line = 0; Line < 64; ++Line)
+    Mix += "  a = a * 31 + b; b ^= a >> 3;\n";
+  Mix += "  return a + b;\n}\n";
+  std::ofstream(Dir / "stepped.c") << SteppedProgram << Mix;
   const std::string Program = (Dir / "stepped").string();
   const std::string Command = "gcc -g -O0 -o '" + Program + "' '" + (Dir / "stepped.c").string() + "'";
   return std::system(Command.c_str()) == 0 ? Program : std::string();
@@ -147,6 +167,91 @@ bool AdapterToMain(TDapClient& Client, const std::string& Program, int& ThreadId
 
 bool RawToMain(bench::TRawGdbPipes& Raw, const std::string& Program) {
   return Raw.Start() && Raw.StartProgram(Program, "main");
+}
+
+/// The whole number Expression gives in the adapter's session; 0 when it
+/// gives none.
+UInt64 AdapterNumber(TDapClient& Client, const std::string& Expression) {
+  const nlohmann::json Value =
+      Client.Response(Client.Send("evaluate", {{"expression", Expression}, {"context", "watch"}}));
+  if (Value.is_null() || !Value.value("success", false))
+    return 0;
+  return std::strtoull(Value["body"].value("result", "").c_str(), nullptr, 0);
+}
+
+/// The whole number Expression gives in the raw session; 0 when it gives
+/// none.
+UInt64 RawNumber(bench::TRawGdbPipes& Raw, const std::string& Expression) {
+  std::string Reply;
+  if (!Raw.Request("-data-evaluate-expression \"" + Expression + "\"", {}, &Reply))
+    return 0;
+  const size_t At = Reply.find("value=\"");
+  return At == std::string::npos ? 0 : std::strtoull(Reply.c_str() + At + 7, nullptr, 0);
+}
+
+/// One 4 KiB read through the adapter; false unless every byte came back.
+bool AdapterRead(TDapClient& Client, UInt64 Address) {
+  const nlohmann::json Read =
+      Client.Response(Client.Send("readMemory", {{"memoryReference", bench::Hex(Address)}, {"count", MemoryChunk}}));
+  if (Read.is_null() || !Read.value("success", false) || Read["body"].contains("unreadableBytes"))
+    return false;
+  // Base64 of 4,096 bytes.
+  return Read["body"].value("data", "").size() == (MemoryChunk + 2) / 3 * 4;
+}
+
+/// The same read as the library sends it to GDB; false unless every byte
+/// came back.
+bool RawRead(bench::TRawGdbPipes& Raw, UInt64 Address) {
+  std::string Reply;
+  if (!Raw.Request("-data-read-memory-bytes " + bench::Hex(Address) + " " + std::to_string(MemoryChunk), {}, &Reply))
+    return false;
+  const size_t Contents = Reply.find("contents=\"");
+  return Contents != std::string::npos && Reply.find('"', Contents + 10) == Contents + 10 + 2 * MemoryChunk;
+}
+
+/// How an adapter's disassemble request went.
+enum class TDisassembled { Done, Unknown, Failed };
+
+TDisassembled AdapterDisassemble(TDapClient& Client, UInt64 Address) {
+  const nlohmann::json Reply = Client.Response(Client.Send(
+      "disassemble", {{"memoryReference", bench::Hex(Address)}, {"instructionOffset", 0},
+                      {"instructionCount", DisassembledInstructions}, {"resolveSymbols", true}}));
+  if (Reply.is_null())
+    return TDisassembled::Failed;
+  if (!Reply.value("success", false))
+    return Reply.value("message", "").find("does not know the request") != std::string::npos ? TDisassembled::Unknown
+                                                                                            : TDisassembled::Failed;
+  const nlohmann::json& Instructions = Reply["body"]["instructions"];
+  return Instructions.is_array() && Instructions.size() == DisassembledInstructions ? TDisassembled::Done
+                                                                                    : TDisassembled::Failed;
+}
+
+/// The MI the adapter's disassemble costs: source and opcodes for 6 bytes
+/// per instruction wanted, and again from where the reply ended while
+/// fewer came back.
+bool RawDisassemble(bench::TRawGdbPipes& Raw, UInt64 Address) {
+  UInt64 Next = Address;
+  for (int Decoded = 0; Decoded < DisassembledInstructions;) {
+    const UInt64 Wanted = static_cast<UInt64>(DisassembledInstructions - Decoded);
+    std::string Reply;
+    if (!Raw.Request("-data-disassemble -s " + bench::Hex(Next) + " -e " +
+                         bench::Hex(Next + Wanted * BytesPerInstruction) + " -- 5",
+                     {}, &Reply))
+      return false;
+    size_t LastAt = std::string::npos;
+    int Count = 0;
+    for (size_t At = Reply.find("address=\""); At != std::string::npos; At = Reply.find("address=\"", At + 1)) {
+      LastAt = At;
+      ++Count;
+    }
+    if (Count == 0)
+      return false;
+    const size_t Opcodes = Reply.find("opcodes=\"", LastAt) + 9;
+    const size_t OpcodesEnd = Reply.find('"', Opcodes);
+    Next = std::strtoull(Reply.c_str() + LastAt + 9, nullptr, 16) + (OpcodesEnd - Opcodes + 1) / 3;
+    Decoded += Count;
+  }
+  return true;
 }
 
 double Median(std::vector<double> Values) {
@@ -276,6 +381,58 @@ int Run() {
     }
     RawPages.push_back(TMilliseconds(TClock::now() - Begin).count());
   }
+
+  // (d) 64 KiB of the array, a 4 KiB read at a time.
+  const UInt64 AdapterMemory = AdapterNumber(Client, "(unsigned long)&memory");
+  const UInt64 RawMemory = RawNumber(Raw, "(unsigned long)&memory");
+  if (AdapterMemory == 0 || RawMemory == 0 || AdapterMemory % MemoryChunk != 0) {
+    std::fprintf(stderr, "dap_bench: cannot find the memory to read\n");
+    return 1;
+  }
+  std::vector<double> AdapterReads, RawReads;
+  for (int Round = 0; Round < Rounds; ++Round) {
+    TClock::time_point Begin = TClock::now();
+    for (int Chunk = 0; Chunk < MemoryChunks; ++Chunk)
+      if (!AdapterRead(Client, AdapterMemory + static_cast<UInt64>(Chunk) * MemoryChunk)) {
+        std::fprintf(stderr, "dap_bench: the adapter did not read 4 KiB\n");
+        return 1;
+      }
+    AdapterReads.push_back(TMilliseconds(TClock::now() - Begin).count());
+    Begin = TClock::now();
+    for (int Chunk = 0; Chunk < MemoryChunks; ++Chunk)
+      if (!RawRead(Raw, RawMemory + static_cast<UInt64>(Chunk) * MemoryChunk)) {
+        std::fprintf(stderr, "dap_bench: GDB did not read 4 KiB\n");
+        return 1;
+      }
+    RawReads.push_back(TMilliseconds(TClock::now() - Begin).count());
+  }
+
+  // (e) 200 instructions from the start of the long function; skipped by an
+  // adapter that does not serve disassembly yet.
+  const UInt64 AdapterMix = AdapterNumber(Client, "(unsigned long)&mix");
+  const UInt64 RawMix = RawNumber(Raw, "(unsigned long)&mix");
+  if (AdapterMix == 0 || RawMix == 0) {
+    std::fprintf(stderr, "dap_bench: cannot find the function to disassemble\n");
+    return 1;
+  }
+  std::vector<double> AdapterListings, RawListings;
+  bool Disassembles = true;
+  for (int Round = 0; Disassembles && Round < Rounds; ++Round) {
+    TClock::time_point Begin = TClock::now();
+    const TDisassembled Listing = AdapterDisassemble(Client, AdapterMix);
+    if (Listing == TDisassembled::Failed) {
+      std::fprintf(stderr, "dap_bench: the adapter did not disassemble %d instructions\n", DisassembledInstructions);
+      return 1;
+    }
+    Disassembles = Listing == TDisassembled::Done;
+    AdapterListings.push_back(TMilliseconds(TClock::now() - Begin).count());
+    Begin = TClock::now();
+    if (!RawDisassemble(Raw, RawMix)) {
+      std::fprintf(stderr, "dap_bench: GDB did not disassemble\n");
+      return 1;
+    }
+    RawListings.push_back(TMilliseconds(TClock::now() - Begin).count());
+  }
   Client.Response(Client.Send("disconnect"));
 
   const double A = Median(AdapterStart), AR = Median(RawStart);
@@ -289,6 +446,19 @@ int Run() {
               ArraySize / PageSize, PageSize, C, CR, Rounds);
   std::printf("ratio (b) adapter / GDB = %.3f\n", B / BR);
   std::printf("ratio (c) adapter / GDB = %.3f\n", C / CR);
+  const double D = Median(AdapterReads), DR = Median(RawReads);
+  std::printf("(d) readMemory of %d KiB in %d requests of %d bytes: adapter %.1f ms, GDB over pipes %.1f ms "
+              "(median of %d)\n", MemoryChunk * MemoryChunks / 1024, MemoryChunks, MemoryChunk, D, DR, Rounds);
+  std::printf("ratio (d) adapter / GDB = %.3f\n", D / DR);
+  if (!Disassembles) {
+    std::printf("(e) disassemble of %d instructions: skipped: the adapter has no disassemble\n",
+                DisassembledInstructions);
+    return 0;
+  }
+  const double E = Median(AdapterListings), ER = Median(RawListings);
+  std::printf("(e) disassemble of %d instructions: adapter %.1f ms, GDB over pipes %.1f ms (median of %d)\n",
+              DisassembledInstructions, E, ER, Rounds);
+  std::printf("ratio (e) adapter / GDB = %.3f\n", E / ER);
   return 0;
 }
 

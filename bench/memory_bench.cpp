@@ -28,11 +28,7 @@ int main(void) {
 }
 )";
 
-std::string Hex(UInt64 Value) {
-  char Text[24];
-  std::snprintf(Text, sizeof Text, "0x%016llX", static_cast<unsigned long long>(Value));
-  return Text;
-}
+using bench::Hex;
 
 /// Builds the program in a scratch directory; empty on failure.
 std::string BuildStopProgram() {
