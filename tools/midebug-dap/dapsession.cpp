@@ -3,6 +3,7 @@
 
 #include "dapsession.h"
 
+#include "dapaddress.h"
 #include "dapframing.h"
 
 #include <chrono>
@@ -28,12 +29,6 @@ constexpr TGDBCPU HostCPU = gcARM64;
 #else
 constexpr TGDBCPU HostCPU = gcAMD64;
 #endif
-
-std::string HexAddress(UInt64 Address) {
-  std::ostringstream Stream;
-  Stream << "0x" << std::hex << Address;
-  return Stream.str();
-}
 
 /// The language of Program from a source file beside it of the same name;
 /// C when there is none.
@@ -165,6 +160,7 @@ const std::vector<TDapSession::TRequestEntry>& TDapSession::Requests() {
       {"setBreakpoints", &TDapSession::SetBreakpoints},
       {"setFunctionBreakpoints", &TDapSession::SetFunctionBreakpoints},
       {"setExceptionBreakpoints", &TDapSession::SetExceptionBreakpoints},
+      {"setInstructionBreakpoints", &TDapSession::SetInstructionBreakpoints},
       {"breakpointLocations", &TDapSession::BreakpointLocations},
       {"exceptionInfo", &TDapSession::ExceptionInfo},
       {"scopes", &TDapSession::Scopes},
@@ -341,6 +337,7 @@ TDapReply TDapSession::Initialize(TDapArguments& Arguments) {
       {"supportsReadMemoryRequest", true},
       {"supportsWriteMemoryRequest", true},
       {"supportsModulesRequest", true},
+      {"supportsInstructionBreakpoints", true},
   });
 }
 
