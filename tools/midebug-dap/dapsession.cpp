@@ -171,6 +171,9 @@ const std::vector<TDapSession::TRequestEntry>& TDapSession::Requests() {
       {"readMemory", &TDapSession::ReadMemory},
       {"writeMemory", &TDapSession::WriteMemory},
       {"modules", &TDapSession::Modules},
+      {"disassemble", &TDapSession::Disassemble},
+      {"gotoTargets", &TDapSession::GotoTargets},
+      {"goto", &TDapSession::Goto},
   };
   return Table;
 }
@@ -254,6 +257,10 @@ void TDapSession::Dispatch(const nlohmann::json& Request) {
       const auto [Address, Count] = *std::exchange(FPendingMemoryEvent, std::nullopt);
       SendEvent("memory", {{"memoryReference", HexAddress(Address)}, {"offset", 0}, {"count", Count}});
     }
+    if (FPendingGotoStop)
+      SendEvent("stopped", {{"reason", "goto"},
+                            {"threadId", *std::exchange(FPendingGotoStop, std::nullopt)},
+                            {"allThreadsStopped", true}});
     return;
   }
   Respond(Request, TDapReply::Refuse("midebug-dap does not know the request '" + Name + "'"));
@@ -338,6 +345,8 @@ TDapReply TDapSession::Initialize(TDapArguments& Arguments) {
       {"supportsWriteMemoryRequest", true},
       {"supportsModulesRequest", true},
       {"supportsInstructionBreakpoints", true},
+      {"supportsDisassembleRequest", true},
+      {"supportsGotoTargetsRequest", true},
   });
 }
 

@@ -245,6 +245,10 @@ private:
   TDapReply ReadMemory(TDapArguments& Arguments);
   TDapReply WriteMemory(TDapArguments& Arguments);
   TDapReply Modules(TDapArguments& Arguments);
+  // Machine code (dapcode.cpp).
+  TDapReply Disassemble(TDapArguments& Arguments);
+  TDapReply GotoTargets(TDapArguments& Arguments);
+  TDapReply Goto(TDapArguments& Arguments);
   /// memoryReference plus offset; nullopt with the problem set.
   std::optional<UInt64> MemoryAddress(TDapArguments& Arguments);
 
@@ -316,6 +320,10 @@ private:
   std::optional<std::pair<std::string, nlohmann::json>> FPendingStop;
   /// The bytes a request changed, announced once it is answered.
   std::optional<std::pair<UInt64, Integer>> FPendingMemoryEvent;
+  /// The addresses gotoTargets offered, by id less one.
+  std::vector<UInt64> FGotoTargets;
+  /// The thread a goto moved, told as a stop once it is answered.
+  std::optional<Integer> FPendingGotoStop;
   /// The modules loaded now, as module events described them, by id.
   std::map<Integer, nlohmann::json> FModules;
   bool FLinesStartAt1 = true;
