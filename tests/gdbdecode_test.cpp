@@ -399,10 +399,13 @@ std::vector<TInstruction> Instructions(const TDataDisassembleResult& Result) {
 }
 
 TEST(DecoderDisassembly, SizesAndSourceLinesWhereTheReplyHasThem) {
-  // GDB 13, mode 3: opcodes give the size, the source line only the first.
+  // GDB 13, mode 3: opcodes give the size, the source line (by its full
+  // name) only the first.
   TDataDisassembleResult Mode3(true);
   ASSERT_TRUE(Decode(Mode3, RecordedReply("regs-gdb13-flags.txt", "6")));
-  EXPECT_EQ(Instructions(Mode3), (std::vector<TInstruction>{{0x555555555172, 1, "push   %rbp", 7, "regs.c"},
+  EXPECT_EQ(Mode3.FData.front().FunctionName, "scale");
+  EXPECT_EQ(Mode3.FData.front().Opcodes, "55");
+  EXPECT_EQ(Instructions(Mode3), (std::vector<TInstruction>{{0x555555555172, 1, "push   %rbp", 7, "/tmp/cap/regs.c"},
                                                              {0x555555555173, 3, "mov    %rsp,%rbp", 0, ""}}));
   // GDB 13, mode 1 on a function compiled without -g: plain instructions.
   TDataDisassembleResult NoLines(true);

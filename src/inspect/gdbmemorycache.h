@@ -55,6 +55,9 @@ public:
   /// address is refused.
   std::unique_ptr<TDataDisassembleResult> DataDisassemble(UInt64 Address, Integer Count);
   std::unique_ptr<TDataDisassembleResult> DataDisassemble(UInt64 StartAddress, UInt64 EndAddress);
+  /// Up to Count instructions from Address, with source lines (GDB); fewer
+  /// where readable memory ends. Bypasses the cache.
+  TGDBDisassembleDataArray Disassemble(UInt64 Address, Integer Count);
   /// The process's one cursor, made on first use.
   TIntfPtr<IGDBDisassemble> Disassembler();
 
@@ -67,6 +70,8 @@ private:
   /// Sends the disassembly and records a failure at Start.
   std::unique_ptr<TDataDisassembleResult> SendDisassemble(UInt64 Start, const std::string& Token,
                                                           const std::string& Line);
+  /// One listing request over [Start, End), leaving the failure record alone.
+  std::unique_ptr<TDataDisassembleResult> AskDisassemble(UInt64 Start, UInt64 End);
   /// Reads memory without the cache; -1 on error.
   Integer ReadFromDebugger(UInt64 Address, TDataByteArray& Bytes, Integer Size);
 

@@ -20,8 +20,16 @@ constexpr UInt64 GDBReadPageSize = 4096;
 /// instruction, then cut to the count.
 constexpr UInt64 GDBBytesPerInstruction = 4;
 
+/// A listing asks for a range of this many bytes an instruction, more than
+/// compiled x86 code averages, so that one request usually holds the count.
+constexpr UInt64 ListingBytesPerInstruction = 6;
+/// The longest x86 instruction.
+constexpr UInt64 LongestInstruction = 15;
+
 /// GDB's instructions-with-opcodes mode: mode 0 gives neither size nor bytes.
 constexpr Integer GDBOpcodesMode = 2;
+/// GDB's source-and-instructions mode with opcodes, in address order.
+constexpr Integer GDBSourceOpcodesMode = 5;
 /// LLDB's plain mode gives each instruction's size.
 constexpr Integer LLDBInstructionsMode = 0;
 
@@ -166,6 +174,63 @@ void TGDBMemoryCache::DisassembleAt(UInt64 Address, Integer& Size, TGDBDisassemb
   SetDisassembleData(std::move(Instructions), std::move(Bytes));
 }
 
+std::unique_ptr<TDataDisassembleResult> TGDBMemoryCache::AskDisassemble(UInt64 Start, UInt64 End) {
+  std::string Token;
+  const std::string Line = FProcess.Requests().Build(
+      Token, static_cast<std::string (TGDBCommand::*)(std::string&, UInt64, UInt64, Integer)>(
+                 &TGDBCommand::CreateDataDisassembleCommand),
+      Start, End, FProcess.IsLLDB() ? LLDBInstructionsMode : GDBSourceOpcodesMode);
+  auto Result = std::make_unique<TDataDisassembleResult>(false);
+  if (!FProcess.ProcessSyncRequest(Token, Line, *Result) || Result->FTimeOut || !Result->FAvailable)
+    Result->FError = true;
+  return Result;
+}
+
+TGDBDisassembleDataArray TGDBMemoryCache::Disassemble(UInt64 Address, Integer Count) {
+  TGDBDisassembleDataArray Listing;
+  UInt64 At = Address;
+  while (Count > 0 && Listing.size() < static_cast<size_t>(Count) && FProcess.Alive()) {
+    const UInt64 Left = static_cast<UInt64>(Count) - Listing.size();
+    UInt64 End = At + Left * ListingBytesPerInstruction;
+    if (End < At)
+      break;
+    auto Reply = AskDisassemble(At, End);
+    if (Reply->FError) {
+      // The range runs into unreadable memory, which fails the whole
+      // request: the readable part is asked again, then without its last
+      // instruction's worth, which may reach past it.
+      TDataByteArray Bytes;
+      const Integer Readable = ReadFromDebugger(At, Bytes, static_cast<Integer>(End - At));
+      if (Readable <= 0)
+        break;
+      End = At + static_cast<UInt64>(Readable);
+      Reply = AskDisassemble(At, End);
+      if (Reply->FError && End - At > LongestInstruction)
+        Reply = AskDisassemble(At, End - LongestInstruction);
+      if (Reply->FError)
+        break;
+    }
+    // A range that holds no instruction start, or one the debugger reads
+    // differently, ends the listing rather than repeating it.
+    const size_t Before = Listing.size();
+    for (TGDBDisassembleData& Instruction : Reply->FData) {
+      if (Instruction.Address < At || Instruction.Size <= 0 || Listing.size() >= static_cast<size_t>(Count))
+        continue;
+      // Only the first instruction of a source line is told its line.
+      if (Instruction.Line == 0 && !Listing.empty() && Listing.size() > Before) {
+        Instruction.Line = Listing.back().Line;
+        Instruction.Source = Listing.back().Source;
+      }
+      Listing.push_back(std::move(Instruction));
+    }
+    if (Listing.size() == Before)
+      break;
+    At = Listing.back().Address + static_cast<UInt64>(Listing.back().Size);
+  }
+  ShowTabsAsBlanks(Listing);
+  return Listing;
+}
+
 // --- The process's operations ------------------------------------------------
 
 Integer TGDBProcess::GetMemory(UInt64 Address, void* Buffer, Integer Size) {
@@ -182,6 +247,10 @@ void TGDBProcess::DisassembleAt(UInt64 Address, Integer& Size, std::string& Text
   TGDBDisassembleData Data;
   FMemory->DisassembleAt(Address, Size, Data);
   Text = Size != -1 ? Data.AsmData : std::string();
+}
+
+TGDBDisassembleDataArray TGDBProcess::Disassemble(UInt64 Address, Integer Count) {
+  return FMemory->Disassemble(Address, Count);
 }
 
 UInt64 TGDBProcess::GetFunctionStart(UInt64 Address) {

@@ -42,6 +42,8 @@ void ReadInstructions(TMIScanner& Scanner, std::string_view List, TGDBDisassembl
     Instruction.Size = ReadInstructionSize(Scanner);
     Instruction.AsmData = std::string(Scanner.FindValue("inst"));
     Instruction.FunctionOffset = Scanner.FindInteger("offset", -1);
+    Instruction.FunctionName = std::string(Scanner.FindValue("func-name"));
+    Instruction.Opcodes = std::string(Scanner.FindValue("opcodes"));
     // Only the first instruction of a source line carries its file and line.
     Instruction.Source = std::move(File);
     Instruction.Line = Line;
@@ -317,7 +319,10 @@ bool DecodeDataDisassemble(TDataDisassembleResult& Disassembly, TMIScanner& Scan
          SourceLine = TakeNext(Scanner, "src_and_asm_line")) {
       TMIScanner::TNestedScan InSourceLine(Scanner, SourceLine);
       const Integer Line = Scanner.FindInteger("line", 0);
-      std::string File(Scanner.FindValue("file"));
+      // The full name where told, as stops report it.
+      std::string File(Scanner.FindValue("fullname"));
+      if (File.empty())
+        File = Scanner.FindValue("file");
       ReadInstructions(Scanner, Scanner.FindValue("line_asm_insn"), Data, Line, std::move(File));
     }
   }

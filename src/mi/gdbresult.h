@@ -92,6 +92,10 @@ struct TGDBDisassembleData {
   std::string Source;
   /// Bytes from the start of the function holding it; -1 when not told.
   Integer FunctionOffset = -1;
+  /// The function holding it and the instruction's bytes in hexadecimal
+  /// ("48 89 e5"), where the debugger tells them.
+  std::string FunctionName;
+  std::string Opcodes;
 };
 
 using TStackFrameArray = std::vector<TGDBStackFrame>;

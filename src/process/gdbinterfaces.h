@@ -249,6 +249,9 @@ public:
   /// Address; LLDB watches what CreateWatchBreakpoint does.
   virtual void CreateSizedWatchBreakpoint(UInt64 Address, Integer Size, bool ReadFlag, bool AccessFlag,
                                           const TIntfPtr<IGDBBreakpointListener>& Listener) = 0;
+  /// Up to Count instructions from Address, each with its function, bytes
+  /// and source line where known; fewer where readable memory ends.
+  virtual TGDBDisassembleDataArray Disassemble(UInt64 Address, Integer Count) = 0;
 };
 
 } // namespace midebug

@@ -1,9 +1,8 @@
 #pragma once
 /// \file
-/// One debugged process: start-up, run control, events to the IDE's listener.
-/// Its state lives in components of one concern and one lock each: request
-/// engine, pending events, module table, language query, and the inspection
-/// components (inspectcomponents.h), whose operations live in src/inspect.
+/// One debugged process: start-up, run control, events to the IDE's listener. Its state lives in components
+/// of one concern and one lock each: request engine, pending events, module table, language query, and the
+/// inspection components (inspectcomponents.h), whose operations live in src/inspect.
 ///
 /// Lock order, outer to inner: the live-process lock (liveprocesses.h, held
 /// for a whole delivery on the main thread); the language query's lock (the
@@ -137,6 +136,7 @@ public:
   void CreateFunctionBreakpoint(const std::string& Name, const TIntfPtr<IGDBBreakpointListener>& Listener) override;
   void CreateSizedWatchBreakpoint(UInt64 Address, Integer Size, bool ReadFlag, bool AccessFlag,
                                   const TIntfPtr<IGDBBreakpointListener>& Listener) override;
+  TGDBDisassembleDataArray Disassemble(UInt64 Address, Integer Count) override;
   bool CanSetRunToMainBreakpoint() const { return FBreakOnMain != nullptr; } ///< run-to-main breakpoint placed
   TGDBThreadTable& Threads() { return *FThreads; }
   TGDBRegisterIds& Registers() { return *FRegisters; }

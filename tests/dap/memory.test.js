@@ -8,19 +8,6 @@ const fs = require('node:fs');
 const { test } = require('node:test');
 const s = require('./support');
 
-/// The end of the first readable mapping of Pid that no mapping follows.
-function endBeforeGap(pid) {
-  const maps = fs.readFileSync(`/proc/${pid}/maps`, 'utf8').trim().split('\n').map((line) => {
-    const [range, perms, , , , name] = line.split(/\s+/);
-    const [start, end] = range.split('-').map((hex) => BigInt(`0x${hex}`));
-    return { start, end, perms, name: name || '' };
-  });
-  const found = maps.find((map, i) => map.perms[0] === 'r' && !map.name.startsWith('[v') &&
-                          i + 1 < maps.length && maps[i + 1].start !== map.end);
-  assert.ok(found, 'no readable mapping before a gap');
-  return found.end;
-}
-
 test('memory reads stop at unreadable bytes, a write reads back with a memory event; modules are listed', async () => {
   const dir = s.scratchDir();
   const client = await s.startClient(dir);
@@ -29,7 +16,7 @@ test('memory reads stop at unreadable bytes, a write reads back with a memory ev
     await s.launch(client, { program, cwd: dir, stopAtEntry: true });
     const pid = s.processesIn(dir).map((line) => line.split(' ')[0])
       .find((id) => fs.readlinkSync(`/proc/${id}/exe`) === program);
-    const end = endBeforeGap(pid);
+    const end = s.endBeforeGap(pid);
     const before = `0x${(end - 16n).toString(16)}`;
 
     const read = await client.send('readMemory', { memoryReference: before, count: 32 });

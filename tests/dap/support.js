@@ -118,6 +118,19 @@ async function leftRunningIn(dir) {
   return left;
 }
 
+/// The end of the first readable mapping of Pid that no mapping follows.
+function endBeforeGap(pid) {
+  const maps = fs.readFileSync(`/proc/${pid}/maps`, 'utf8').trim().split('\n').map((line) => {
+    const [range, perms, , , , name] = line.split(/\s+/);
+    const [start, end] = range.split('-').map((hex) => BigInt(`0x${hex}`));
+    return { start, end, perms, name: name || '' };
+  });
+  const found = maps.find((map, i) => map.perms[0] === 'r' && !map.name.startsWith('[v') &&
+                          i + 1 < maps.length && maps[i + 1].start !== map.end);
+  assert.ok(found, 'no readable mapping before a gap');
+  return found.end;
+}
+
 /// Resolves with the exit code once Child has ended.
 function exitOf(child) {
   if (child.exitCode !== null)
@@ -127,5 +140,5 @@ function exitOf(child) {
 
 module.exports = {
   adapter, debuggee, source, markerLine, scratchDir, startClient, outputOf, waitForOutput, launch, stopAfter,
-  topFrame, processesIn, leftRunningIn, exitOf, WAIT,
+  topFrame, processesIn, leftRunningIn, endBeforeGap, exitOf, WAIT,
 };

@@ -5,9 +5,11 @@
 // from the Nth on, "%N" on every Nth (N a whole number from 1); anything else
 // is refused. Hits are counted only when the condition, if any, holds.
 
+#include "dapaddress.h"
 #include "dapsession.h"
 
 #include <algorithm>
+#include <cstdlib>
 #include <filesystem>
 
 namespace midebug::dap {
@@ -90,9 +92,11 @@ bool ValueIsTrue(const std::string& Value) {
 
 } // namespace
 
-std::shared_ptr<TDapSession::TBreakpoint> TDapSession::ReadBreakpoint(const nlohmann::json& Entry, bool Function) {
+std::shared_ptr<TDapSession::TBreakpoint> TDapSession::ReadBreakpoint(const nlohmann::json& Entry,
+                                                                       TBreakpointKind Kind) {
   auto Breakpoint = std::make_shared<TBreakpoint>();
   Breakpoint->Id = ++FNextBreakpointId;
+  Breakpoint->Kind = Kind;
   auto Text = [&](const char* Name) {
     const auto Found = Entry.is_object() ? Entry.find(Name) : Entry.end();
     if (Entry.is_object() && Found != Entry.end() && !Found->is_null() && !Found->is_string() &&
@@ -105,11 +109,23 @@ std::shared_ptr<TDapSession::TBreakpoint> TDapSession::ReadBreakpoint(const nloh
     Breakpoint->Message = "a breakpoint must be an object";
     return Breakpoint;
   }
-  if (Function) {
+  if (Kind == TBreakpointKind::Function) {
     Breakpoint->Function = Text("name");
     if (Breakpoint->Function.empty() && Breakpoint->Message.empty())
       Breakpoint->Message = "a function breakpoint needs a 'name'";
-  } else {
+  } else if (Kind == TBreakpointKind::Instruction) {
+    const auto Address = ParseAddress(Text("instructionReference"));
+    const auto Offset = Entry.find("offset");
+    const bool OffsetGood = Offset == Entry.end() || Offset->is_null() ||
+                            (Offset->is_number_integer() && std::llabs(Offset->get<long long>()) < (1LL << 40));
+    if ((!Address || !OffsetGood) && Breakpoint->Message.empty())
+      Breakpoint->Message = "an instruction breakpoint needs an 'instructionReference' such as 0x401000 and a "
+                            "whole-number 'offset'";
+    else if (Address)
+      Breakpoint->Address = *Address + static_cast<UInt64>(OffsetGood && Offset != Entry.end() && !Offset->is_null()
+                                                              ? Offset->get<long long>()
+                                                              : 0);
+  } else if (Kind == TBreakpointKind::Source) {
     const auto Line = Entry.find("line");
     if (Line == Entry.end() || !Line->is_number_integer() || Line->get<long long>() < (FLinesStartAt1 ? 1 : 0) ||
         Line->get<long long>() > 0x7fffffff)
@@ -132,10 +148,21 @@ void TDapSession::PlaceBreakpoint(TBreakpoint& Breakpoint) {
     return;
   Breakpoint.Placed = true;
   TIntfPtr<IGDBBreakpointListener> Listener(new TDapBreakpointListener(FListener, Breakpoint.Id));
-  if (Breakpoint.Function.empty())
+  switch (Breakpoint.Kind) {
+  case TBreakpointKind::Source:
     FProcess->CreateSourceBreakpoint(Breakpoint.Source, Breakpoint.Line, Listener);
-  else
+    break;
+  case TBreakpointKind::Function:
     FProcess->CreateFunctionBreakpoint(Breakpoint.Function, Listener);
+    break;
+  case TBreakpointKind::Instruction:
+    FProcess->CreateAddressBreakpoint(Breakpoint.Address, Listener);
+    break;
+  case TBreakpointKind::Data:
+    FProcess->CreateSizedWatchBreakpoint(Breakpoint.Address, Breakpoint.Size, Breakpoint.Access == "read",
+                                         Breakpoint.Access == "readWrite", Listener);
+    break;
+  }
 }
 
 void TDapSession::PlaceBreakpoints() {
@@ -149,10 +176,10 @@ void TDapSession::PlaceBreakpoints() {
   }
 }
 
-void TDapSession::RemoveBreakpoints(bool Functions, const std::string& Source) {
+void TDapSession::RemoveBreakpoints(TBreakpointKind Kind, const std::string& Source) {
   for (auto Entry = FBreakpoints.begin(); Entry != FBreakpoints.end();) {
     const TBreakpoint& Breakpoint = *Entry->second;
-    if (Functions != !Breakpoint.Function.empty() || (!Functions && Breakpoint.Source != Source)) {
+    if (Breakpoint.Kind != Kind || (Kind == TBreakpointKind::Source && Breakpoint.Source != Source)) {
       ++Entry;
       continue;
     }
@@ -172,9 +199,11 @@ nlohmann::json TDapSession::BreakpointJson(const TBreakpoint& Breakpoint) const 
     Entry["line"] = ClientLine(Breakpoint.Location.Line);
     Entry["source"] = {{"name", std::filesystem::path(Breakpoint.Location.Source).filename().string()},
                        {"path", Breakpoint.Location.Source}};
-  } else if (Breakpoint.Function.empty()) {
+  } else if (Breakpoint.Kind == TBreakpointKind::Source) {
     Entry["line"] = ClientLine(Breakpoint.Line);
   }
+  if (Breakpoint.Kind == TBreakpointKind::Instruction && Breakpoint.Message.empty())
+    Entry["instructionReference"] = HexAddress(Breakpoint.Address);
   return Entry;
 }
 
@@ -190,10 +219,10 @@ TDapReply TDapSession::SetBreakpoints(TDapArguments& Arguments) {
   if ((List = Arguments.Value("breakpoints")) && !List->is_array())
     return TDapReply::Refuse("'breakpoints' must be a list");
   const std::string File = Path->get<std::string>();
-  RemoveBreakpoints(false, File);
+  RemoveBreakpoints(TBreakpointKind::Source, File);
   std::vector<std::shared_ptr<TBreakpoint>> Set;
   for (const nlohmann::json& Entry : List ? *List : None) {
-    Set.push_back(ReadBreakpoint(Entry, false));
+    Set.push_back(ReadBreakpoint(Entry, TBreakpointKind::Source));
     Set.back()->Source = File;
     FBreakpoints[Set.back()->Id] = Set.back();
   }
@@ -212,17 +241,25 @@ TDapReply TDapSession::PlaceAndAnswer(const std::vector<std::shared_ptr<TBreakpo
   return TDapReply::Ok({{"breakpoints", Answer}});
 }
 
-TDapReply TDapSession::SetFunctionBreakpoints(TDapArguments& Arguments) {
+TDapReply TDapSession::ReplaceBreakpoints(TDapArguments& Arguments, TBreakpointKind Kind, const char* Request) {
   const nlohmann::json* List = nullptr;
   if (!(List = Arguments.Value("breakpoints")) || !List->is_array())
-    return TDapReply::Refuse("setFunctionBreakpoints needs a list 'breakpoints'");
-  RemoveBreakpoints(true, "");
+    return TDapReply::Refuse(std::string(Request) + " needs a list 'breakpoints'");
+  RemoveBreakpoints(Kind, "");
   std::vector<std::shared_ptr<TBreakpoint>> Set;
   for (const nlohmann::json& Entry : *List) {
-    Set.push_back(ReadBreakpoint(Entry, true));
+    Set.push_back(ReadBreakpoint(Entry, Kind));
     FBreakpoints[Set.back()->Id] = Set.back();
   }
   return PlaceAndAnswer(Set);
+}
+
+TDapReply TDapSession::SetFunctionBreakpoints(TDapArguments& Arguments) {
+  return ReplaceBreakpoints(Arguments, TBreakpointKind::Function, "setFunctionBreakpoints");
+}
+
+TDapReply TDapSession::SetInstructionBreakpoints(TDapArguments& Arguments) {
+  return ReplaceBreakpoints(Arguments, TBreakpointKind::Instruction, "setInstructionBreakpoints");
 }
 
 TDapReply TDapSession::SetExceptionBreakpoints(TDapArguments& Arguments) {
@@ -315,8 +352,9 @@ void TDapSession::OnBreakpointVerified(Integer Id, bool Verified, Integer Number
   if (Verified)
     Breakpoint.Location = Location;
   if (Number < 0 && !Verified && Breakpoint.Message.empty())
-    Breakpoint.Message = Breakpoint.Function.empty() ? "the debugger cannot place a breakpoint there"
-                                                     : "the debugger cannot place a breakpoint on that function";
+    Breakpoint.Message = Breakpoint.Kind == TBreakpointKind::Function
+                             ? "the debugger cannot place a breakpoint on that function"
+                             : "the debugger cannot place a breakpoint there";
   if (Changed && !FPlacingForResponse)
     SendEvent("breakpoint", {{"reason", "changed"}, {"breakpoint", BreakpointJson(Breakpoint)}});
 }

@@ -2,13 +2,11 @@
 // rather than failing whole, and writes that tell the client what changed;
 // and the modules the program has loaded.
 
+#include "dapaddress.h"
 #include "dapsession.h"
 
 #include <algorithm>
-#include <cerrno>
 #include <cstring>
-#include <cstdlib>
-#include <sstream>
 #include <vector>
 
 namespace midebug::dap {
@@ -60,12 +58,6 @@ std::optional<std::vector<Byte>> DecodeBase64(const std::string& Text) {
   return Bytes;
 }
 
-std::string HexAddress(UInt64 Address) {
-  std::ostringstream Stream;
-  Stream << "0x" << std::hex << Address;
-  return Stream.str();
-}
-
 } // namespace
 
 std::optional<UInt64> TDapSession::MemoryAddress(TDapArguments& Arguments) {
@@ -76,14 +68,12 @@ std::optional<UInt64> TDapSession::MemoryAddress(TDapArguments& Arguments) {
       Arguments.Refuse("'memoryReference' is missing");
     return std::nullopt;
   }
-  char* End = nullptr;
-  errno = 0;
-  const unsigned long long Address = std::strtoull(Reference->c_str(), &End, 0);
-  if (Reference->empty() || *End != '\0' || errno != 0 || Reference->front() == '-') {
+  const auto Address = ParseAddress(*Reference);
+  if (!Address) {
     Arguments.Refuse("'memoryReference' must be an address such as 0x401000");
     return std::nullopt;
   }
-  return static_cast<UInt64>(Address) + static_cast<UInt64>(Offset.value_or(0));
+  return *Address + static_cast<UInt64>(Offset.value_or(0));
 }
 
 TDapReply TDapSession::ReadMemory(TDapArguments& Arguments) {

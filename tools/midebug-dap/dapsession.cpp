@@ -3,6 +3,7 @@
 
 #include "dapsession.h"
 
+#include "dapaddress.h"
 #include "dapframing.h"
 
 #include <chrono>
@@ -28,12 +29,6 @@ constexpr TGDBCPU HostCPU = gcARM64;
 #else
 constexpr TGDBCPU HostCPU = gcAMD64;
 #endif
-
-std::string HexAddress(UInt64 Address) {
-  std::ostringstream Stream;
-  Stream << "0x" << std::hex << Address;
-  return Stream.str();
-}
 
 /// The language of Program from a source file beside it of the same name;
 /// C when there is none.
@@ -165,6 +160,7 @@ const std::vector<TDapSession::TRequestEntry>& TDapSession::Requests() {
       {"setBreakpoints", &TDapSession::SetBreakpoints},
       {"setFunctionBreakpoints", &TDapSession::SetFunctionBreakpoints},
       {"setExceptionBreakpoints", &TDapSession::SetExceptionBreakpoints},
+      {"setInstructionBreakpoints", &TDapSession::SetInstructionBreakpoints},
       {"breakpointLocations", &TDapSession::BreakpointLocations},
       {"exceptionInfo", &TDapSession::ExceptionInfo},
       {"scopes", &TDapSession::Scopes},
@@ -175,6 +171,9 @@ const std::vector<TDapSession::TRequestEntry>& TDapSession::Requests() {
       {"readMemory", &TDapSession::ReadMemory},
       {"writeMemory", &TDapSession::WriteMemory},
       {"modules", &TDapSession::Modules},
+      {"disassemble", &TDapSession::Disassemble},
+      {"gotoTargets", &TDapSession::GotoTargets},
+      {"goto", &TDapSession::Goto},
   };
   return Table;
 }
@@ -258,6 +257,10 @@ void TDapSession::Dispatch(const nlohmann::json& Request) {
       const auto [Address, Count] = *std::exchange(FPendingMemoryEvent, std::nullopt);
       SendEvent("memory", {{"memoryReference", HexAddress(Address)}, {"offset", 0}, {"count", Count}});
     }
+    if (FPendingGotoStop)
+      SendEvent("stopped", {{"reason", "goto"},
+                            {"threadId", *std::exchange(FPendingGotoStop, std::nullopt)},
+                            {"allThreadsStopped", true}});
     return;
   }
   Respond(Request, TDapReply::Refuse("midebug-dap does not know the request '" + Name + "'"));
@@ -341,6 +344,9 @@ TDapReply TDapSession::Initialize(TDapArguments& Arguments) {
       {"supportsReadMemoryRequest", true},
       {"supportsWriteMemoryRequest", true},
       {"supportsModulesRequest", true},
+      {"supportsInstructionBreakpoints", true},
+      {"supportsDisassembleRequest", true},
+      {"supportsGotoTargetsRequest", true},
   });
 }
 

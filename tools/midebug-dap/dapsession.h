@@ -162,6 +162,7 @@ private:
   TDapReply SetBreakpoints(TDapArguments& Arguments);
   TDapReply SetFunctionBreakpoints(TDapArguments& Arguments);
   TDapReply SetExceptionBreakpoints(TDapArguments& Arguments);
+  TDapReply SetInstructionBreakpoints(TDapArguments& Arguments);
   TDapReply BreakpointLocations(TDapArguments& Arguments);
   TDapReply ExceptionInfo(TDapArguments& Arguments);
   TDapReply Scopes(TDapArguments& Arguments);
@@ -170,12 +171,22 @@ private:
   TDapReply SetExpression(TDapArguments& Arguments);
   TDapReply Evaluate(TDapArguments& Arguments);
 
-  /// One breakpoint of the client's: a source line or a function.
+  /// What a breakpoint of the client's stands on; each set request
+  /// replaces the breakpoints of its kind.
+  enum class TBreakpointKind { Source, Function, Instruction, Data };
+  /// One breakpoint of the client's: a source line, a function, an
+  /// instruction or data.
   struct TBreakpoint {
     Integer Id = 0;
+    TBreakpointKind Kind = TBreakpointKind::Source;
     std::string Source;
     Integer Line = 0;
     std::string Function;
+    /// The instruction's address, or the data's, and the data's size.
+    UInt64 Address = 0;
+    Integer Size = 0;
+    /// A data breakpoint's access: "write", "read" or "readWrite".
+    std::string Access;
     std::string Condition;
     std::string LogMessage;
     /// The hit condition: 0 none, '=' on the Nth hit, '>' after the Nth,
@@ -191,15 +202,18 @@ private:
     std::string Message;
   };
   /// Reads one breakpoint of a set request; a refusal leaves Message set.
-  std::shared_ptr<TBreakpoint> ReadBreakpoint(const nlohmann::json& Entry, bool Function);
+  std::shared_ptr<TBreakpoint> ReadBreakpoint(const nlohmann::json& Entry, TBreakpointKind Kind);
   void PlaceBreakpoint(TBreakpoint& Breakpoint);
   /// Places what was set before the program was there.
   void PlaceBreakpoints();
-  void RemoveBreakpoints(bool Functions, const std::string& Source);
+  /// Removes the breakpoints of Kind (of a source kind, those in Source).
+  void RemoveBreakpoints(TBreakpointKind Kind, const std::string& Source);
   nlohmann::json BreakpointJson(const TBreakpoint& Breakpoint) const;
   /// Places a set request's breakpoints where the program is there, and
   /// answers their verdicts (no events meanwhile).
   TDapReply PlaceAndAnswer(const std::vector<std::shared_ptr<TBreakpoint>>& Set);
+  /// Replaces every breakpoint of Kind with the request's list.
+  TDapReply ReplaceBreakpoints(TDapArguments& Arguments, TBreakpointKind Kind, const char* Request);
   /// The text of a log message with each {expression} evaluated.
   std::string Interpolate(IGDBThread& Thread, const std::string& Message);
 
@@ -231,6 +245,10 @@ private:
   TDapReply ReadMemory(TDapArguments& Arguments);
   TDapReply WriteMemory(TDapArguments& Arguments);
   TDapReply Modules(TDapArguments& Arguments);
+  // Machine code (dapcode.cpp).
+  TDapReply Disassemble(TDapArguments& Arguments);
+  TDapReply GotoTargets(TDapArguments& Arguments);
+  TDapReply Goto(TDapArguments& Arguments);
   /// memoryReference plus offset; nullopt with the problem set.
   std::optional<UInt64> MemoryAddress(TDapArguments& Arguments);
 
@@ -302,6 +320,10 @@ private:
   std::optional<std::pair<std::string, nlohmann::json>> FPendingStop;
   /// The bytes a request changed, announced once it is answered.
   std::optional<std::pair<UInt64, Integer>> FPendingMemoryEvent;
+  /// The addresses gotoTargets offered, by id less one.
+  std::vector<UInt64> FGotoTargets;
+  /// The thread a goto moved, told as a stop once it is answered.
+  std::optional<Integer> FPendingGotoStop;
   /// The modules loaded now, as module events described them, by id.
   std::map<Integer, nlohmann::json> FModules;
   bool FLinesStartAt1 = true;
