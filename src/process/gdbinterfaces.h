@@ -249,6 +249,10 @@ public:
   /// Address; LLDB watches what CreateWatchBreakpoint does.
   virtual void CreateSizedWatchBreakpoint(UInt64 Address, Integer Size, bool ReadFlag, bool AccessFlag,
                                           const TIntfPtr<IGDBBreakpointListener>& Listener) = 0;
+  /// The source files the debugger knows of the program and the libraries
+  /// it has loaded, by full name where it found one; empty when it cannot
+  /// tell.
+  virtual TStringArray GetSourceFiles() = 0;
 };
 
 } // namespace midebug
