@@ -171,6 +171,10 @@ const std::vector<TDapSession::TRequestEntry>& TDapSession::Requests() {
       {"readMemory", &TDapSession::ReadMemory},
       {"writeMemory", &TDapSession::WriteMemory},
       {"modules", &TDapSession::Modules},
+      {"dataBreakpointInfo", &TDapSession::DataBreakpointInfo},
+      {"setDataBreakpoints", &TDapSession::SetDataBreakpoints},
+      {"loadedSources", &TDapSession::LoadedSources},
+      {"source", &TDapSession::Source},
   };
   return Table;
 }
@@ -338,6 +342,8 @@ TDapReply TDapSession::Initialize(TDapArguments& Arguments) {
       {"supportsWriteMemoryRequest", true},
       {"supportsModulesRequest", true},
       {"supportsInstructionBreakpoints", true},
+      {"supportsDataBreakpoints", true},
+      {"supportsLoadedSourcesRequest", true},
   });
 }
 
