@@ -82,6 +82,11 @@ std::optional<std::pair<UInt64, Integer>> TDapSession::FindStorage(IGDBThread& T
     Why = Value.empty() ? "it has no address" : Value;
     return std::nullopt;
   }
+  // The debugger gives a function a size of 1: its code is no data.
+  if (TypeName.find(")(") != std::string::npos) {
+    Why = "it is a function";
+    return std::nullopt;
+  }
   const auto Address = PointerValue(Value);
   if (!Address) {
     Why = "its address reads " + Value;

@@ -18,7 +18,7 @@ constexpr std::uintmax_t MaxSourceSize = 16 << 20;
 TDapReply TDapSession::LoadedSources(TDapArguments& /*Arguments*/) {
   namespace fs = std::filesystem;
   nlohmann::json List = nlohmann::json::array();
-  if (!FProcess || FState == TProgramState::Lost || FState == TProgramState::Detached)
+  if (!FProcess || ProgramGone())
     return TDapReply::Ok({{"sources", List}});
   // The debugger also names the sources of libraries built elsewhere, by
   // paths that lead nowhere here: only files the client can open are told.
