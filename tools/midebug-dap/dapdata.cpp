@@ -167,7 +167,9 @@ void TDapSession::ReadDataBreakpoint(const nlohmann::json& Entry, TBreakpoint& B
     Breakpoint.Message = "a data breakpoint needs a 'dataId' that dataBreakpointInfo gave";
     return;
   }
-  Breakpoint.Access = Access != Entry.end() && Access->is_string() ? Access->get<std::string>() : "write";
+  Breakpoint.Access = Access == Entry.end() || Access->is_null() ? "write"
+                      : Access->is_string()                      ? Access->get<std::string>()
+                                                                 : "";
   if (Breakpoint.Access != "write" && Breakpoint.Access != "read" && Breakpoint.Access != "readWrite") {
     Breakpoint.Message = "'accessType' must be \"write\", \"read\" or \"readWrite\"";
     return;

@@ -40,14 +40,19 @@ TDapReply TDapSession::Source(TDapArguments& Arguments) {
   if (!Arguments.Problem().empty())
     return TDapReply::Refuse(Arguments.Problem());
   std::string Path;
-  if (Given)
+  long long Number = Reference.value_or(0);
+  if (Given) {
     if (const auto Found = Given->find("path"); Found != Given->end() && Found->is_string())
       Path = Found->get<std::string>();
+    // The source's own reference outranks the request's.
+    if (const auto Found = Given->find("sourceReference"); Found != Given->end() && Found->is_number_integer())
+      Number = Found->get<long long>();
+  }
   if (Path.empty()) {
     // The adapter gives every source by its path and hands out no
     // references.
-    if (Reference && *Reference > 0)
-      return TDapReply::Refuse("the source reference " + std::to_string(*Reference) +
+    if (Number != 0)
+      return TDapReply::Refuse("the source reference " + std::to_string(Number) +
                                " is unknown: midebug-dap names its sources by path");
     return TDapReply::Refuse("source needs 'source' with a 'path'");
   }
