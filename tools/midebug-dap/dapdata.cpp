@@ -17,8 +17,8 @@ namespace {
 /// several debug registers).
 constexpr Integer MaxWatchSize = 4096;
 
-#if defined(__x86_64__) || defined(__i386__)
-/// x86 has four debug registers, each watching 1, 2, 4 or 8 bytes aligned
+#if defined(__x86_64__)
+/// x86-64 has four debug registers, each watching 1, 2, 4 or 8 bytes aligned
 /// to their size. GDB splits a range into such pieces and, failing to fit
 /// them, falls back to single-stepping the program (a write watch) or
 /// refuses the next resume: the adapter counts the pieces first.
