@@ -191,6 +191,12 @@ void TGDBProcess::GetSourceLines(const std::string& FileName, TIntegerArray& Lin
   }
 }
 
+TStringArray TGDBProcess::GetSourceFiles() {
+  TFileListExecSourceFilesResult Sources;
+  WhilePaused([&] { FRequests.Ask(Sources, &TGDBCommand::CreateFileListExecSourceFilesCommand); });
+  return Sources.FFiles;
+}
+
 TAddressArray TGDBProcess::FindSourceAddress(Integer FileIndex, Integer Line) {
   TAddressArray Addresses;
   if (FLines->FindLineAddress(FileIndex, Line, Addresses))

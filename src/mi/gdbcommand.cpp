@@ -682,6 +682,10 @@ std::string TGDBCommand::CreateFileListExecSourceFileCommand(std::string& Token)
   return MiLine(Token, ctFileListExecSourceFile, "");
 }
 
+std::string TGDBCommand::CreateFileListExecSourceFilesCommand(std::string& Token) {
+  return MiLine(Token, ctFileListExecSourceFiles, "");
+}
+
 std::string TGDBCommand::CreateTargetAttachCommand(std::string& Token, Integer Pid, bool UseCLI) {
   if (UseCLI)
     return CLLine(ctCLProcessAttach, " --pid " + std::to_string(Pid));

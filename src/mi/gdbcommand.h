@@ -293,6 +293,7 @@ public:
   /// The file goes in double quotes, escaped as an MI c-string.
   std::string CreateFileExecAndSymbolsCommand(std::string& Token, const std::string& File);
   std::string CreateFileListExecSourceFileCommand(std::string& Token);
+  std::string CreateFileListExecSourceFilesCommand(std::string& Token);
   /// UseCLI sends LLDB's "process attach --pid" without token; Token is left
   /// alone.
   std::string CreateTargetAttachCommand(std::string& Token, Integer Pid, bool UseCLI);

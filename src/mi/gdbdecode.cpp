@@ -10,6 +10,7 @@
 
 #include <algorithm>
 #include <map>
+#include <set>
 
 namespace midebug {
 
@@ -377,6 +378,24 @@ bool DecodeSymbolListLines(TSymbolListLinesResult& Lines, TMIScanner& Scanner) {
   return true;
 }
 
+bool DecodeFileListExecSourceFiles(TFileListExecSourceFilesResult& Sources, TMIScanner& Scanner) {
+  std::string_view List;
+  if (!FindResult(Scanner, "files", List))
+    return false;
+  // A header included by many units is listed once for each.
+  std::set<std::string_view> Seen;
+  ForEachElement(Scanner, List, [&](std::string_view Element) {
+    if (Element.empty())
+      return;
+    std::string_view Name = Scanner.FindValue("fullname");
+    if (Name.empty())
+      Name = Scanner.FindValue("file");
+    if (!Name.empty() && Seen.insert(Name).second)
+      Sources.FFiles.push_back(Text(Name));
+  });
+  return true;
+}
+
 bool DecodeVarCreate(TVarCreateResult& Create, TMIScanner& Scanner) {
   Create.FName = Text(Scanner.FindValue("name"));
   // The whole count: the children are listed a window at a time.
@@ -576,6 +595,8 @@ bool DecodeResult(TGDBResult& Result, TMIScanner& Scanner, bool IsLLDB) {
     return DecodeAs(Result, Scanner, DecodeStackListLocals);
   case ctSymbolListLines:
     return DecodeAs(Result, Scanner, DecodeSymbolListLines);
+  case ctFileListExecSourceFiles:
+    return DecodeAs(Result, Scanner, DecodeFileListExecSourceFiles);
   case ctVarCreate:
     return DecodeAs(Result, Scanner, DecodeVarCreate);
   case ctVarInfoNumChildren:

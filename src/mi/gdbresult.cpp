@@ -64,6 +64,8 @@ TFileExecAndSymbolsResult::TFileExecAndSymbolsResult() : TGDBResult(ctFileExecAn
 TSymbolListLinesResult::TSymbolListLinesResult(bool IncludeAddress)
     : TGDBResult(ctSymbolListLines), FIncludeAddress(IncludeAddress) {}
 
+TFileListExecSourceFilesResult::TFileListExecSourceFilesResult() : TGDBResult(ctFileListExecSourceFiles) {}
+
 TTargetAttachResult::TTargetAttachResult() : TGDBResult(ctTargetAttach) {}
 
 TExecRunResult::TExecRunResult() : TGDBResult(ctExecRun) {}

@@ -207,6 +207,14 @@ public:
   bool FIncludeAddress;
 };
 
+/// The source files of the program and its libraries, each by its full
+/// name where the debugger knows one, once each.
+class TFileListExecSourceFilesResult : public TGDBResult {
+public:
+  TFileListExecSourceFilesResult();
+  TStringArray FFiles;
+};
+
 class TTargetAttachResult : public TGDBResult {
 public:
   TTargetAttachResult();

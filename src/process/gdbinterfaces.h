@@ -252,6 +252,10 @@ public:
   /// Up to Count instructions from Address, each with its function, bytes
   /// and source line where known; fewer where readable memory ends.
   virtual TGDBDisassembleDataArray Disassemble(UInt64 Address, Integer Count) = 0;
+  /// The source files the debugger knows of the program and the libraries
+  /// it has loaded, by full name where it found one; empty when it cannot
+  /// tell.
+  virtual TStringArray GetSourceFiles() = 0;
 };
 
 } // namespace midebug

@@ -4,12 +4,10 @@
 /// of one concern and one lock each: request engine, pending events, module table, language query, and the
 /// inspection components (inspectcomponents.h), whose operations live in src/inspect.
 ///
-/// Lock order, outer to inner: the live-process lock (liveprocesses.h, held
-/// for a whole delivery on the main thread); the language query's lock (the
-/// whole question); the wait-object table, then a result's monitor
-/// (gdbrequestengine.h); then the leaf locks, each held for one operation:
-/// the builder and send locks, the language answer, the pending events, the
-/// module table, the program terminal and every inspection component.
+/// Lock order, outer to inner: the live-process lock (liveprocesses.h, held for a whole delivery on the main
+/// thread); the language query's lock (the whole question); the wait-object table, then a result's monitor
+/// (gdbrequestengine.h); then the leaf locks, each held for one operation: the builder and send locks, the
+/// language answer, the pending events, the module table, the program terminal and every inspection component.
 
 #include "kernel/gdbkernel.h"
 #include "process/gdbinterfaces.h"
@@ -137,6 +135,7 @@ public:
   void CreateSizedWatchBreakpoint(UInt64 Address, Integer Size, bool ReadFlag, bool AccessFlag,
                                   const TIntfPtr<IGDBBreakpointListener>& Listener) override;
   TGDBDisassembleDataArray Disassemble(UInt64 Address, Integer Count) override;
+  TStringArray GetSourceFiles() override;
   bool CanSetRunToMainBreakpoint() const { return FBreakOnMain != nullptr; } ///< run-to-main breakpoint placed
   TGDBThreadTable& Threads() { return *FThreads; }
   TGDBRegisterIds& Registers() { return *FRegisters; }

@@ -58,9 +58,10 @@ test('initialize advertises what is served, and the rest is refused in words', a
     for (const served of ['supportsConfigurationDoneRequest', 'supportsTerminateRequest', 'supportsCancelRequest',
                           'supportsSteppingGranularity', 'supportsDelayedStackTraceLoading', 'supportTerminateDebuggee',
                           'supportsFunctionBreakpoints', 'supportsConditionalBreakpoints', 'supportsSetVariable',
-                          'supportsEvaluateForHovers', 'supportsHitConditionalBreakpoints', 'supportsLogPoints', 'supportsReadMemoryRequest'])
+                          'supportsEvaluateForHovers', 'supportsHitConditionalBreakpoints', 'supportsLogPoints', 'supportsReadMemoryRequest',
+                          'supportsDataBreakpoints', 'supportsLoadedSourcesRequest'])
       assert.equal(capabilities[served], true, served);
-    for (const missing of ['supportsDataBreakpoints', 'supportsRestartRequest'])
+    for (const missing of ['supportsRestartRequest'])
       assert.notEqual(capabilities[missing], true, missing);
     await assert.rejects(client.initializeRequest({ adapterID: 'midebug' }), /already/);
 

@@ -22,6 +22,7 @@ std::unique_ptr<TGDBResult> CreateResultFor(TMiCommand Command, uint8_t Flags) {
   case ctBreakInsert: return std::make_unique<TBreakInsertResult>();
   case ctBreakWatch: return std::make_unique<TBreakWatchResult>();
   case ctSymbolListLines: return std::make_unique<TSymbolListLinesResult>(Flag);
+  case ctFileListExecSourceFiles: return std::make_unique<TFileListExecSourceFilesResult>();
   case ctThreadListIds: return std::make_unique<TThreadListIdsResult>();
   case ctThreadInfo: return std::make_unique<TThreadInfoResult>(Flag);
   case ctPidInfo: return std::make_unique<TPidInfoResult>();

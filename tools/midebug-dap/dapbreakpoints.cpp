@@ -125,6 +125,8 @@ std::shared_ptr<TDapSession::TBreakpoint> TDapSession::ReadBreakpoint(const nloh
       Breakpoint->Address = *Address + static_cast<UInt64>(OffsetGood && Offset != Entry.end() && !Offset->is_null()
                                                               ? Offset->get<long long>()
                                                               : 0);
+  } else if (Kind == TBreakpointKind::Data) {
+    ReadDataBreakpoint(Entry, *Breakpoint);
   } else if (Kind == TBreakpointKind::Source) {
     const auto Line = Entry.find("line");
     if (Line == Entry.end() || !Line->is_number_integer() || Line->get<long long>() < (FLinesStartAt1 ? 1 : 0) ||
@@ -351,10 +353,26 @@ void TDapSession::OnBreakpointVerified(Integer Id, bool Verified, Integer Number
   Breakpoint.Verified = Verified;
   if (Verified)
     Breakpoint.Location = Location;
+  if (Breakpoint.Kind == TBreakpointKind::Data && !Verified && Number >= 0) {
+    // GDB took the watch but could not fit it in the processor when the
+    // program went on, and refused to go on: with the watch gone the next
+    // resume can.
+    Breakpoint.Message = UnplacedWatchText();
+    if (FProcess && !ProgramGone())
+      FProcess->DeleteBreakpoint(Number);
+    Breakpoint.Number = -1;
+    const std::string Removed =
+        "data breakpoint " + std::to_string(Id) + " on " + Breakpoint.Watched + " is removed: " + Breakpoint.Message;
+    Output("console", "midebug-dap: " + Removed + "\n");
+    // The refused resume is told as a stop where the program stood.
+    if (FState == TProgramState::Running)
+      FPendingStop.emplace("data breakpoint", nlohmann::json{{"description", "The program did not go on: " + Removed}});
+  }
   if (Number < 0 && !Verified && Breakpoint.Message.empty())
     Breakpoint.Message = Breakpoint.Kind == TBreakpointKind::Function
                              ? "the debugger cannot place a breakpoint on that function"
-                             : "the debugger cannot place a breakpoint there";
+                         : Breakpoint.Kind == TBreakpointKind::Data ? "the debugger cannot watch that memory"
+                                                                    : "the debugger cannot place a breakpoint there";
   if (Changed && !FPlacingForResponse)
     SendEvent("breakpoint", {{"reason", "changed"}, {"breakpoint", BreakpointJson(Breakpoint)}});
 }

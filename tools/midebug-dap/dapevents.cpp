@@ -157,8 +157,21 @@ void TDapSession::OnSuspended(Integer ThreadId) {
   } else {
     TIntfPtr<IGDBThread> Thread = FProcess ? FProcess->GetThread(ThreadId) : nullptr;
     Body["reason"] = StopReasonWord(Thread ? Thread->GetStopReason() : tsrUnknown);
-    if (Body["reason"] == "breakpoint" && !FHitBreakpoints.empty())
+    if (Body["reason"] == "breakpoint" && !FHitBreakpoints.empty()) {
       Body["hitBreakpointIds"] = FHitBreakpoints;
+      // The first breakpoint that kept the program stopped names the stop.
+      const auto First = FBreakpoints.find(FHitBreakpoints.front());
+      const TBreakpoint* Hit = First != FBreakpoints.end() ? First->second.get() : nullptr;
+      if (Hit && Hit->Kind == TBreakpointKind::Instruction) {
+        Body["reason"] = "instruction breakpoint";
+      } else if (Hit && Hit->Kind == TBreakpointKind::Data) {
+        Body["reason"] = "data breakpoint";
+        Body["description"] = "Data breakpoint: " + Hit->Watched +
+                              (Hit->Access == "write"  ? " changed"
+                               : Hit->Access == "read" ? " was read"
+                                                       : " was accessed");
+      }
+    }
   }
   FEntryPending = false;
   FPausePending = false;

@@ -174,6 +174,10 @@ const std::vector<TDapSession::TRequestEntry>& TDapSession::Requests() {
       {"disassemble", &TDapSession::Disassemble},
       {"gotoTargets", &TDapSession::GotoTargets},
       {"goto", &TDapSession::Goto},
+      {"dataBreakpointInfo", &TDapSession::DataBreakpointInfo},
+      {"setDataBreakpoints", &TDapSession::SetDataBreakpoints},
+      {"loadedSources", &TDapSession::LoadedSources},
+      {"source", &TDapSession::Source},
   };
   return Table;
 }
@@ -347,6 +351,8 @@ TDapReply TDapSession::Initialize(TDapArguments& Arguments) {
       {"supportsInstructionBreakpoints", true},
       {"supportsDisassembleRequest", true},
       {"supportsGotoTargetsRequest", true},
+      {"supportsDataBreakpoints", true},
+      {"supportsLoadedSourcesRequest", true},
   });
 }
 

@@ -187,6 +187,8 @@ private:
     Integer Size = 0;
     /// A data breakpoint's access: "write", "read" or "readWrite".
     std::string Access;
+    /// What a data breakpoint watches, as dataBreakpointInfo described it.
+    std::string Watched;
     std::string Condition;
     std::string LogMessage;
     /// The hit condition: 0 none, '=' on the Nth hit, '>' after the Nth,
@@ -240,6 +242,23 @@ private:
                         const std::string& Type, nlohmann::json& Entry);
   TDapReply Assign(const TIntfPtr<IGDBThread>& Thread, Integer Frame, const std::string& Expr,
                    const std::string& Value, bool Hex);
+
+  // Sources (dapsources.cpp).
+  TDapReply LoadedSources(TDapArguments& Arguments);
+  TDapReply Source(TDapArguments& Arguments);
+
+  // Data breakpoints (dapdata.cpp).
+  TDapReply DataBreakpointInfo(TDapArguments& Arguments);
+  TDapReply SetDataBreakpoints(TDapArguments& Arguments);
+  /// Reads a data breakpoint's dataId and access; a refusal, or a watch
+  /// the hardware cannot hold beside the others, leaves Message set.
+  void ReadDataBreakpoint(const nlohmann::json& Entry, TBreakpoint& Breakpoint);
+  /// Why the debugger could not place a watch it had accepted.
+  static std::string UnplacedWatchText();
+  /// The address and size of Expr in Frame; nullopt, with Why set, when it
+  /// lies in no memory (a register, a bit-field, a computed value).
+  std::optional<std::pair<UInt64, Integer>> FindStorage(IGDBThread& Thread, Integer Frame, const std::string& Expr,
+                                                        std::string& Why);
 
   // Memory (dapmemory.cpp).
   TDapReply ReadMemory(TDapArguments& Arguments);
@@ -318,6 +337,8 @@ private:
   bool FPausePending = false;
   /// What the last signal or exception said, for the stop that follows it.
   std::optional<std::pair<std::string, nlohmann::json>> FPendingStop;
+  /// What dataBreakpointInfo answered, by dataId.
+  std::map<std::string, std::string> FDataDescriptions;
   /// The bytes a request changed, announced once it is answered.
   std::optional<std::pair<UInt64, Integer>> FPendingMemoryEvent;
   /// The addresses gotoTargets offered, by id less one.

@@ -215,6 +215,10 @@ TDapReply TDapSession::Variables(TDapArguments& Arguments) {
 
 TDapReply TDapSession::Assign(const TIntfPtr<IGDBThread>& Thread, Integer Frame, const std::string& Expr,
                               const std::string& Value, bool Hex) {
+  // Asked first: the assignment goes to the last value evaluated. A value
+  // without an address (a register variable) changes no memory.
+  std::string NoMemory;
+  const auto Storage = FindStorage(*Thread, Frame, Expr, NoMemory);
   std::string Old, TypeName, New;
   bool CanModify = false;
   if (Thread->Evaluate(Expr, "", Frame, Old, CanModify, TypeName) != ercOk)
@@ -223,6 +227,8 @@ TDapReply TDapSession::Assign(const TIntfPtr<IGDBThread>& Thread, Integer Frame,
     return TDapReply::Refuse(Expr + " cannot be changed");
   if (Thread->Modify(Value, New) != ercOk)
     return TDapReply::Refuse(New.empty() ? "cannot assign " + Value + " to " + Expr : New);
+  if (Storage)
+    FPendingMemoryEvent = Storage;
   return TDapReply::Ok({{"value", Hex ? InHex(New) : New}, {"type", TypeName}});
 }
 
