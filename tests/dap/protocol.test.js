@@ -59,7 +59,8 @@ test('initialize advertises what is served, and the rest is refused in words', a
                           'supportsSteppingGranularity', 'supportsDelayedStackTraceLoading', 'supportTerminateDebuggee',
                           'supportsFunctionBreakpoints', 'supportsConditionalBreakpoints', 'supportsSetVariable',
                           'supportsEvaluateForHovers', 'supportsHitConditionalBreakpoints', 'supportsLogPoints', 'supportsReadMemoryRequest',
-                          'supportsDataBreakpoints', 'supportsLoadedSourcesRequest'])
+                          'supportsDataBreakpoints', 'supportsLoadedSourcesRequest', 'supportsDisassembleRequest',
+                          'supportsInstructionBreakpoints', 'supportsGotoTargetsRequest'])
       assert.equal(capabilities[served], true, served);
     for (const missing of ['supportsRestartRequest'])
       assert.notEqual(capabilities[missing], true, missing);
