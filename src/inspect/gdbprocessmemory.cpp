@@ -23,6 +23,8 @@ constexpr UInt64 GDBBytesPerInstruction = 4;
 /// A listing asks for a range of this many bytes an instruction, more than
 /// compiled x86 code averages, so that one request usually holds the count.
 constexpr UInt64 ListingBytesPerInstruction = 6;
+/// Instructions asked for in one listing request, which bounds its reply.
+constexpr UInt64 ListingBlockCount = 1000;
 /// The longest x86 instruction.
 constexpr UInt64 LongestInstruction = 15;
 
@@ -190,7 +192,7 @@ TGDBDisassembleDataArray TGDBMemoryCache::Disassemble(UInt64 Address, Integer Co
   TGDBDisassembleDataArray Listing;
   UInt64 At = Address;
   while (Count > 0 && Listing.size() < static_cast<size_t>(Count) && FProcess.Alive()) {
-    const UInt64 Left = static_cast<UInt64>(Count) - Listing.size();
+    const UInt64 Left = std::min<UInt64>(static_cast<UInt64>(Count) - Listing.size(), ListingBlockCount);
     UInt64 End = At + Left * ListingBytesPerInstruction;
     if (End < At)
       break;

@@ -13,7 +13,7 @@ namespace midebug::dap {
 namespace {
 
 /// The most instructions one disassemble request may ask for.
-constexpr long long MaxInstructions = 100000;
+constexpr long long MaxInstructions = 10000;
 /// Instruction offsets a request may name, either way.
 constexpr long long MaxInstructionOffset = 1000000;
 /// Unreadable memory is reported a byte an instruction up to the next page,
