@@ -186,6 +186,7 @@ void TDapSession::OnResumed(Integer ThreadId) {
   FFrames.clear();
   FVariables.clear();
   FHitBreakpoints.clear();
+  FGotoTargets.clear();
   SendEvent("continued", {{"threadId", ThreadId}, {"allThreadsContinued", true}});
 }
 

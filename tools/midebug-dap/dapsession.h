@@ -341,7 +341,7 @@ private:
   std::map<std::string, std::string> FDataDescriptions;
   /// The bytes a request changed, announced once it is answered.
   std::optional<std::pair<UInt64, Integer>> FPendingMemoryEvent;
-  /// The addresses gotoTargets offered, by id less one.
+  /// The addresses gotoTargets offered since the last stop, by id less one.
   std::vector<UInt64> FGotoTargets;
   /// The thread a goto moved, told as a stop once it is answered.
   std::optional<Integer> FPendingGotoStop;
