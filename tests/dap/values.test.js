@@ -17,7 +17,7 @@ test('scopes, variables, evaluate and assignments of a C frame; a 100,000-elemen
   const client = await s.startClient();
   try {
     const initialized = client.waitForEvent('initialized');
-    await client.initializeRequest({ adapterID: 'midebug' });
+    await client.initializeRequest({ adapterID: 'midebug', supportsMemoryReferences: true });
     await initialized;
     await client.setBreakpointsRequest({ source: { path: s.source('values.c') }, breakpoints: [{ line: stopLine }] });
     const stopped = client.waitForEvent('stopped');
@@ -34,6 +34,10 @@ test('scopes, variables, evaluate and assignments of a C frame; a 100,000-elemen
     assert.deepEqual(args.map((v) => v.name), ['number', 'scale', 'mark', 'where']);
     assert.equal(args[0].value, '3');
     assert.ok(args[3].variablesReference > 0, 'a pointer expands');
+    // Its memory is where it points: the first member, x, is there.
+    const pointed = await client.send('readMemory', { memoryReference: args[3].memoryReference, count: 4 });
+    const x = await client.evaluateRequest({ expression: 'where->x', frameId: frame.id, context: 'watch' });
+    assert.equal(Buffer.from(pointed.body.data, 'base64').readInt32LE(0), Number(x.body.result));
     assert.equal((await variables(client, scopes[1].variablesReference, { format: { hex: true } }))[0].value, '0x3');
     const locals = await variables(client, scopes[0].variablesReference);
     const area = locals.find((v) => v.name === 'area');

@@ -61,16 +61,6 @@ std::optional<long long> LeadingNumber(const std::string& Text) {
   return std::stoll(Digits);
 }
 
-/// The address in a pointer's value as the debugger prints it
-/// ("0x601040 <counter>", "(long *) 0x601040").
-std::optional<UInt64> PointerValue(const std::string& Value) {
-  const size_t Hex = Value.find("0x");
-  if (Hex == std::string::npos)
-    return std::nullopt;
-  const size_t End = Value.find_first_not_of("0123456789abcdefABCDEF", Hex + 2);
-  return ParseAddress(Value.substr(Hex, End == std::string::npos ? std::string::npos : End - Hex));
-}
-
 } // namespace
 
 std::optional<std::pair<UInt64, Integer>> TDapSession::FindStorage(IGDBThread& Thread, Integer Frame,

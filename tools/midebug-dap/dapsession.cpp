@@ -317,12 +317,14 @@ TDapReply TDapSession::Initialize(TDapArguments& Arguments) {
   const bool LinesStartAt1 = Arguments.Boolean("linesStartAt1").value_or(true);
   const bool ColumnsStartAt1 = Arguments.Boolean("columnsStartAt1").value_or(true);
   const bool ClientHasTerminal = Arguments.Boolean("supportsRunInTerminalRequest").value_or(false);
+  const bool ClientHasMemoryViews = Arguments.Boolean("supportsMemoryReferences").value_or(false);
   if (!Arguments.Problem().empty())
     return TDapReply::Refuse(Arguments.Problem());
   FInitialized = true;
   FLinesStartAt1 = LinesStartAt1;
   FColumnsStartAt1 = ColumnsStartAt1;
   FClientHasTerminal = ClientHasTerminal;
+  FClientHasMemoryViews = ClientHasMemoryViews;
   // Exactly what works.
   return TDapReply::Ok({
       {"supportsConfigurationDoneRequest", true},

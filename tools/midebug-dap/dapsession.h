@@ -317,6 +317,8 @@ private:
   bool FAttached = false;
   /// The client offers to start programs in its terminal.
   bool FClientHasTerminal = false;
+  /// The client opens memory where a value's memoryReference points.
+  bool FClientHasMemoryViews = false;
   /// The program runs in the client's terminal (launched, though attached to).
   bool FInTerminal = false;
   TStandInMeeting FMeeting;

@@ -1,6 +1,7 @@
 // The adapter's values: scopes of a frame, variables paged through the
 // library's inspectors, evaluation and assignment.
 
+#include "dapaddress.h"
 #include "dapsession.h"
 
 #include <sstream>
@@ -201,6 +202,8 @@ TDapReply TDapSession::Variables(TDapArguments& Arguments) {
       const TIntfPtr<IGDBInspect> Child =
           Ref.Inspect->CreateSubInspector(iiVariable, (Locals ? 0 : Ref.Inspect->GetInspectRangeStart()) + Slot);
       nlohmann::json Entry = {{"name", Name}, {"value", Hex ? InHex(Value) : Value}, {"type", TypeName}};
+      if (const auto Target = PointerTarget(TypeName, Value); Target && FClientHasMemoryViews)
+        Entry["memoryReference"] = HexAddress(*Target);
       const std::string Full = Child ? Child->GetFullExpr() : std::string();
       if (!Full.empty())
         Entry["evaluateName"] = Full;
@@ -282,6 +285,8 @@ TDapReply TDapSession::Evaluate(TDapArguments& Arguments) {
   if (Thread->Evaluate(*Expression, Hex ? "x" : "", Frame, Value, CanModify, TypeName) != ercOk)
     return TDapReply::Refuse(Value.empty() ? "cannot evaluate " + *Expression : Value);
   nlohmann::json Body = {{"result", Value}, {"type", TypeName}, {"variablesReference", 0}};
+  if (const auto Target = PointerTarget(TypeName, Value); Target && FClientHasMemoryViews)
+    Body["memoryReference"] = HexAddress(*Target);
   // A value with members gets an inspector; a hover of a plain value needs
   // none.
   const bool Composite = Value.starts_with("{") || TypeName.find('[') != std::string::npos ||
