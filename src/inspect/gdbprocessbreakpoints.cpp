@@ -75,14 +75,8 @@ void TGDBProcess::WhilePaused(const std::function<void()>& Work) {
   if (Aborted)
     return;
   Work();
-  if (!Paused || !FAlive || FRequests.FatalError())
-    return;
-  FInternalResume = true;
-  Resume();
-  Integer Timeout = FRequests.SyncTimeout();
-  while (FResuming && FAlive && !FRequests.WaitForReplyTimeOut(Timeout, true)) {
-  }
-  FInternalResume = false;
+  if (Paused && FAlive && !FRequests.FatalError())
+    ResumeUnheard(true);
 }
 
 void TGDBProcess::InsertBreakpoint(const std::function<std::string(TGDBCommand&, std::string&)>& Create,

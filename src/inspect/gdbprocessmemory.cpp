@@ -219,7 +219,7 @@ TGDBDisassembleDataArray TGDBMemoryCache::Disassemble(UInt64 Address, Integer Co
       if (Instruction.Address < At || Instruction.Size <= 0 || Listing.size() >= static_cast<size_t>(Count))
         continue;
       // Only the first instruction of a source line is told its line.
-      if (Instruction.Line == 0 && !Listing.empty() && Listing.size() > Before) {
+      if (Instruction.Line == 0 && Listing.size() > Before) {
         Instruction.Line = Listing.back().Line;
         Instruction.Source = Listing.back().Source;
       }

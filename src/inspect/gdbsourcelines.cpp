@@ -181,14 +181,8 @@ void TGDBProcess::GetSourceLines(const std::string& FileName, TIntegerArray& Lin
     return;
   TAddressArray Unused;
   ListLines(FRequests, IsWindows(), TGDBFileTable::DebuggerName(FileName, IsWindows()), false, Lines, Unused);
-  if (Paused && FAlive) {
-    FInternalResume = true;
-    Resume();
-    Integer Timeout = FRequests.SyncTimeout();
-    while (FResuming && FAlive && !FRequests.WaitForReplyTimeOut(Timeout, false)) {
-    }
-    FInternalResume = false;
-  }
+  if (Paused && FAlive)
+    ResumeUnheard(false);
 }
 
 TStringArray TGDBProcess::GetSourceFiles() {

@@ -165,6 +165,7 @@ private:
   /// Pauses a synchronous target unheard; true when this call paused it; Aborted when it failed.
   bool SyncTargetPause(bool& Aborted, bool FatalOnExpiry);
   void ASyncTargetResume(); ///< resumes an asynchronous target paused inside the process, unheard
+  void ResumeUnheard(bool FatalOnExpiry); ///< resumes and awaits the running report; the IDE hears neither
   TGDBLanguage GetCurrentLanguage();
   /// A signal or language exception stopped it: an Expected one is a plain stop, else the IDE decides.
   void NotifyInterruption(const TGDBException& Event, Integer ThreadId, bool Expected, TThreadStopReason Reason);

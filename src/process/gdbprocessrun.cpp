@@ -67,15 +67,19 @@ bool TGDBProcess::SyncTargetPause(bool& Aborted, bool FatalOnExpiry) {
   return true;
 }
 
-void TGDBProcess::ASyncTargetResume() {
-  if (!FAsyncTarget || !FAlive || FRequests.FatalError())
-    return;
+void TGDBProcess::ResumeUnheard(bool FatalOnExpiry) {
   FInternalResume = true;
   Resume();
   Integer Timeout = FRequests.SyncTimeout();
-  while (FResuming && FAlive && !FRequests.WaitForReplyTimeOut(Timeout, true)) {
+  while (FResuming && FAlive && !FRequests.WaitForReplyTimeOut(Timeout, FatalOnExpiry)) {
   }
   FInternalResume = false;
+}
+
+void TGDBProcess::ASyncTargetResume() {
+  if (!FAsyncTarget || !FAlive || FRequests.FatalError())
+    return;
+  ResumeUnheard(true);
 }
 
 void TGDBProcess::Terminate() {
